@@ -1,0 +1,98 @@
+// Repeat points of a set's sources, converted between bytes and milliseconds.
+#include <climits>
+#include <cstring>
+
+#include "engine/engine_internal.h"
+#include "kova/kova_engine.h"
+
+namespace {
+
+// Product of rate and channels in 32 bits, wrapping like the 32-bit multiply it stands for
+// (garbage read from a file must not turn into undefined behaviour).
+int32_t frame_rate(int32_t sample_rate, int32_t channels) {
+    return static_cast<int32_t>(static_cast<uint32_t>(sample_rate) *
+                                static_cast<uint32_t>(channels));
+}
+
+}  // namespace
+
+extern "C" {
+
+KOVA_API int64_t _cvt_byte_to_ms(int32_t bytes, int32_t sample_rate, int32_t channels) {
+    const int32_t rate = frame_rate(sample_rate, channels);
+    // A format without samples per second has no duration; answer 0 instead of dividing by 0.
+    if (rate <= 0) return 0;
+    const double ms = static_cast<double>(bytes) * 1000.0 / (2.0 * static_cast<double>(rate));
+    return static_cast<int64_t>(ms);
+}
+
+KOVA_API int32_t _cvt_ms_to_byte(int64_t ms, int32_t sample_rate, int32_t channels) {
+    if (ms < 1) return 0;
+    const int32_t rate = frame_rate(sample_rate, channels);
+    if (rate <= 0 || channels <= 0) return 0;
+    int64_t b = 0;
+    // Saturate instead of overflowing; such values lie far beyond any source anyway.
+    if (__builtin_mul_overflow(ms, static_cast<int64_t>(rate) * 2, &b)) b = INT64_MAX;
+    const double q = static_cast<double>(b) / 1000.0;
+    const int32_t bytes = q >= static_cast<double>(INT32_MAX) ? INT32_MAX : static_cast<int32_t>(q);
+    const int64_t frame = 2 * static_cast<int64_t>(channels);
+    return static_cast<int32_t>((bytes / frame) * frame);
+}
+
+KOVA_API int32_t kova_get_rptinfo(KOVA_CTX* ctx, int32_t index, KOVA_RPT_INFO* info) {
+    if (!_ctx_alive(ctx) || !_srcset_index_ok(ctx, index) || info == nullptr) {
+        return KOVA_ERR_INVALID_PARAM;
+    }
+    KovaCtxLock lock(ctx);
+    std::memset(info, 0, sizeof(*info));
+    const KOVA_SRCSET* set = _fetch_srcset(ctx, index);
+    if (set == nullptr) return KOVA_ERR_INVALID_PARAM;
+
+    const auto rate = static_cast<int32_t>(ctx->format->sample_rate);
+    const auto channels = static_cast<int32_t>(ctx->format->channels);
+    for (int slot = 0; slot < KOVA_SLOT_COUNT; ++slot) {
+        const KOVA_SRC* src = set->src[slot];
+        if (src == nullptr) {
+            info->len_ms[slot] = 0;
+            info->rpt_start_ms[slot] = -1;
+            info->rpt_end_ms[slot] = -1;
+            continue;
+        }
+        info->rpt_start_ms[slot] =
+            static_cast<int32_t>(_cvt_byte_to_ms(src->rpt_start, rate, channels));
+        info->rpt_end_ms[slot] =
+            static_cast<int32_t>(_cvt_byte_to_ms(src->rpt_end, rate, channels));
+        info->len_ms[slot] = _cvt_byte_to_ms(src->size, rate, channels);
+    }
+    return KOVA_OK;
+}
+
+// A loop-slot rpt_end below 10 bytes (0 ms included) is stored as given: generation then plays
+// the loop over the whole source, so such a value is harmless and refusing it would only make
+// "0 stores 0 bytes" untrue for one slot.
+KOVA_API int32_t kova_set_rptinfo(KOVA_CTX* ctx, int32_t index, const KOVA_RPT_INFO* info) {
+    if (!_ctx_alive(ctx) || !_srcset_index_ok(ctx, index) || info == nullptr) {
+        return KOVA_ERR_INVALID_PARAM;
+    }
+    KovaCtxLock lock(ctx);
+    KOVA_SRCSET* set = _fetch_srcset(ctx, index);
+    if (set == nullptr) return KOVA_ERR_INVALID_PARAM;
+
+    const auto rate = static_cast<int32_t>(ctx->format->sample_rate);
+    const auto channels = static_cast<int32_t>(ctx->format->channels);
+    for (int slot = 0; slot < KOVA_SLOT_COUNT; ++slot) {
+        KOVA_SRC* src = set->src[slot];
+        if (src == nullptr) continue;
+        const int64_t len_ms = _cvt_byte_to_ms(src->size, rate, channels);
+        auto store = [&](int32_t v, int32_t& field) {
+            if (v < 0 || v > len_ms) return;
+            const int32_t bytes = _cvt_ms_to_byte(v, rate, channels);
+            field = bytes > src->size ? src->size : bytes;
+        };
+        store(info->rpt_start_ms[slot], src->rpt_start);
+        store(info->rpt_end_ms[slot], src->rpt_end);
+    }
+    return KOVA_OK;
+}
+
+}  // extern "C"
