@@ -1,1 +1,0 @@
-// Placeholder until the AudioTrack stand-in lands.
