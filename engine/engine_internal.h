@@ -48,6 +48,22 @@ class KovaCtxLock {
 
 /* Registration helpers (register_files.cpp). */
 
+/* Fills the tune set a set gets when it is registered from files or from a filter; the two ways
+ * differ only in the noise and file levels. */
+inline void _fill_reg_tune(KOVA_TUNE_SET* t, double wn_gain, double file_gain) {
+    t->gain = 1.0;
+    t->pan = 0.4;
+    t->osc_enable = 0;
+    t->osc_depth = 1.0;
+    t->sharp_enable = 0;
+    t->sharpness = 0.2;
+    t->wn_gain = wn_gain;
+    t->file_gain = file_gain;
+    t->start_gain = 0.6;
+    t->loop_gain = 0.9;
+    t->end_gain = 0.6;
+}
+
 /* A new, empty set: cleared record, zeroed tune set, empty filter list, thickness 0.6.
  * Null when an allocation failed (nothing is left allocated). */
 KOVA_SRCSET* _srcset_new(void);

@@ -1,0 +1,180 @@
+// Editing a registered set: its filters (replace, attach, read back) and its PCM files, each
+// followed by rebuilding every working copy from the unfiltered samples.
+#include <cmath>
+#include <cstdio>
+#include <cstring>
+
+#include "engine/engine_internal.h"
+#include "kova/kova_dsp.h"
+#include "kova/kova_engine.h"
+#include "kova/kova_source.h"
+#include "util/kova_mem.h"
+
+namespace {
+
+// Highest descriptor rate taken; well above any PCM rate this library handles.
+constexpr int32_t kMaxFilterRate = 384000;
+
+// Slots in the order the working copies are rebuilt after a filter change.
+constexpr int kRefilterOrder[KOVA_SLOT_COUNT] = {KOVA_SLOT_LOOP, KOVA_SLOT_START, KOVA_SLOT_END};
+
+// Working copy = unfiltered samples through the set's filters; play position back to the start.
+void rebuild_working_copy(KOVA_SRC* src, LIST* filters) {
+    if (src->size > 0 && src->pcm != nullptr && src->pcm_proc != nullptr) {
+        std::memcpy(src->pcm_proc, src->pcm, static_cast<size_t>(src->size));
+        kova_proc_filters(src->pcm_proc, static_cast<uint32_t>(src->size), filters);
+    }
+    src->pos = 0;
+}
+
+// Replaces the set's descriptor of the same type and rebuilds every working copy; file sources
+// are read again from disk first. Takes ownership of the 512-byte path buffer. Mutex held.
+int32_t update_filter_locked(KOVA_SRCSET* set, int32_t index, const KOVA_FLT_DSC* dsc, int32_t* err,
+                             char* path_buf) {
+    if (kova_update_filterdsc(set->filters, dsc) < 0) {
+        puts("kova_update_filterdsc() < 0 ");
+        kova_mem_free(path_buf);
+        return 0;
+    }
+    for (const int slot : kRefilterOrder) {
+        KOVA_SRC* src = set->src[slot];
+        if (src == nullptr) continue;
+        if (src->origin == KOVA_ORIGIN_FILE && src->path != nullptr) {
+            // The path lives in the source being released: keep a copy for the reload.
+            std::memset(path_buf, 0, KOVA_PATH_BUF_BYTES);
+            std::strncpy(path_buf, src->path, KOVA_PATH_BUF_BYTES - 1);
+            kova_free_sourceobj(src);
+            // A file that cannot be read again leaves its slot empty; the update still succeeds.
+            set->src[slot] = kova_load_sound_source(path_buf, slot, err);
+            src = set->src[slot];
+            if (src == nullptr) continue;
+        }
+        rebuild_working_copy(src, set->filters);
+    }
+    kova_mem_free(path_buf);
+    *err = KOVA_OK;
+    return index;
+}
+
+}  // namespace
+
+// Besides the type code, a descriptor must describe a filter whose design stays finite and
+// stable: a positive rate, a frequency strictly between 0 and Nyquist (tan(pi*f/fs) is 0 or
+// infinite at the ends), for the band types also such a bandwidth, one or two channels, no NaN or
+// infinity anywhere. The bandwidth of low- and high-pass filters is unused and only has to be
+// finite.
+bool _flt_dsc_usable(const KOVA_FLT_DSC* dsc) {
+    if (dsc == nullptr || kova_is_valid_filter(dsc) != 1) return false;
+    if (dsc->samplerate <= 0 || dsc->samplerate > kMaxFilterRate) return false;
+    if (dsc->channels < 1 || dsc->channels > 2) return false;
+    if (!std::isfinite(dsc->freq) || !std::isfinite(dsc->bandwidth)) return false;
+    const double nyquist = dsc->samplerate / 2.0;
+    if (!(dsc->freq > 0.0 && dsc->freq < nyquist)) return false;
+    const bool band = dsc->type == KOVA_FLT_BANDPASS || dsc->type == KOVA_FLT_BANDREJECT;
+    if (band && !(dsc->bandwidth > 0.0 && dsc->bandwidth < nyquist)) return false;
+    return true;
+}
+
+extern "C" {
+
+KOVA_API int32_t kova_update_filter(KOVA_CTX* ctx, int32_t index, const KOVA_FLT_DSC* dsc,
+                                    int32_t* err) {
+    if (err == nullptr) return 0;
+    *err = KOVA_ERR_INVALID_PARAM;
+    // Degenerate descriptors are refused like an invalid type, with the context untouched.
+    if (!_ctx_alive(ctx) || !_srcset_index_ok(ctx, index) || !_flt_dsc_usable(dsc)) return 0;
+
+    KovaCtxLock lock(ctx);
+    KOVA_SRCSET* set = _fetch_srcset(ctx, index);
+    if (set == nullptr) return 0;
+    // The path buffer is taken before anything changes, so running out of memory reports -2 and
+    // leaves the set's filters and sources as they were.
+    auto* path_buf = static_cast<char*>(kova_mem_malloc(KOVA_PATH_BUF_BYTES));
+    if (path_buf == nullptr) {
+        *err = KOVA_ERR_INSUFF_MEM;
+        return 0;
+    }
+    return update_filter_locked(set, index, dsc, err, path_buf);
+}
+
+KOVA_API int32_t kova_attach_filter(KOVA_CTX* ctx, int32_t index, const KOVA_FLT_DSC* dsc,
+                                    int32_t* err) {
+    if (err == nullptr) return 0;
+    *err = KOVA_ERR_INVALID_PARAM;
+    if (!_ctx_alive(ctx) || !_srcset_index_ok(ctx, index) || !_flt_dsc_usable(dsc)) return 0;
+
+    // Attaching and refiltering happen under one hold of the mutex, so no other operation sees
+    // the new descriptor before the sources are rebuilt with it; every allocation comes first,
+    // so a failure leaves the set unchanged.
+    KovaCtxLock lock(ctx);
+    KOVA_SRCSET* set = _fetch_srcset(ctx, index);
+    if (set == nullptr) return 0;
+    auto* path_buf = static_cast<char*>(kova_mem_malloc(KOVA_PATH_BUF_BYTES));
+    if (path_buf == nullptr) {
+        *err = KOVA_ERR_INSUFF_MEM;
+        return 0;
+    }
+    if (set->filters != nullptr && kova_update_filterdsc(set->filters, dsc) < 0) {
+        auto* copy = static_cast<KOVA_FLT_DSC*>(kova_mem_malloc(sizeof(KOVA_FLT_DSC)));
+        if (copy != nullptr) std::memcpy(copy, dsc, sizeof(KOVA_FLT_DSC));
+        if (copy == nullptr || list_pushback(set->filters, copy) == nullptr) {
+            kova_mem_free(copy);
+            kova_mem_free(path_buf);
+            *err = KOVA_ERR_INSUFF_MEM;
+            return 0;
+        }
+    }
+    return update_filter_locked(set, index, dsc, err, path_buf);
+}
+
+KOVA_API int32_t kova_get_filters(KOVA_CTX* ctx, int32_t index,
+                                  KOVA_FLT_DSC flt[KOVA_FLT_TYPE_COUNT]) {
+    if (!_ctx_alive(ctx) || !_srcset_index_ok(ctx, index) || flt == nullptr) return 0;
+    KovaCtxLock lock(ctx);
+    const KOVA_SRCSET* set = _fetch_srcset(ctx, index);
+    if (set == nullptr || set->filters == nullptr) return 0;
+    for (NODE* n = set->filters->head->next; n != nullptr && n != set->filters->tail; n = n->next) {
+        const auto* dsc = static_cast<const KOVA_FLT_DSC*>(n->data);
+        // Types read from a file may lie outside the array; they have no element and are skipped.
+        if (dsc != nullptr && dsc->type < KOVA_FLT_TYPE_COUNT) flt[dsc->type] = *dsc;
+    }
+    return 0;
+}
+
+KOVA_API int32_t kova_update_src_byfiles(KOVA_CTX* ctx, int32_t index,
+                                         const char* const paths[KOVA_SLOT_COUNT], int32_t* err) {
+    if (err == nullptr) return 0;
+    *err = KOVA_ERR_INVALID_PARAM;
+    // A missing path array is refused as an invalid argument rather than read as "keep all".
+    if (!_ctx_alive(ctx) || !_srcset_index_ok(ctx, index) || paths == nullptr) return 0;
+
+    KovaCtxLock lock(ctx);
+    KOVA_SRCSET* set = _fetch_srcset(ctx, index);
+    if (set == nullptr) {
+        *err = KOVA_ERR_SOURCE;
+        return 0;
+    }
+    for (int slot = 0; slot < KOVA_SLOT_COUNT; ++slot) {
+        if (paths[slot] == nullptr) continue;
+        kova_free_sourceobj(set->src[slot]);
+        set->src[slot] = kova_load_sound_source(paths[slot], slot, err);
+    }
+    // Kept slots already hold a filtered working copy: rebuilding every slot from its unfiltered
+    // samples applies the filters exactly once to old and new sources alike.
+    for (KOVA_SRC* src : set->src) {
+        if (src != nullptr) rebuild_working_copy(src, set->filters);
+    }
+    // A set whose loop slot ended up empty stays registered; generation refuses to play it.
+    if (set->src[KOVA_SLOT_LOOP] == nullptr) {
+        *err = KOVA_ERR_SOURCE;
+        return 0;
+    }
+    if (set->tune != nullptr) {
+        set->tune->file_gain = 0.4;
+        set->tune->wn_gain = 0.0;
+    }
+    *err = KOVA_OK;
+    return index;
+}
+
+}  // extern "C"
