@@ -1,0 +1,35 @@
+/* Arithmetic helpers shared by the signal blocks, where outputs must be bit-exact on every target.
+ *
+ * Include this header LAST in a source file: the pragma below applies to every function defined
+ * after it, and standard headers should keep their own settings. */
+#ifndef KOVA_DSP_EXACT_MATH_H
+#define KOVA_DSP_EXACT_MATH_H
+
+#include <cstdint>
+
+/* No fused multiply-add: a*b + c must round twice, as written, or the filter, equaliser and
+ * oscillator outputs change in their last bits (clang contracts within expressions by default,
+ * GCC across them on AArch64). */
+#if defined(__clang__)
+#pragma STDC FP_CONTRACT OFF
+#elif defined(__GNUC__)
+#pragma GCC optimize("fp-contract=off")
+#endif
+
+namespace kova::dsp {
+
+inline constexpr double kPi = 3.141592653589793;
+inline constexpr double kTwoPi = 6.283185307179586;
+
+/* Truncates toward zero to 32 bits, saturating at the limits. NaN gives 0: a plain cast would be
+ * undefined for NaN and for values out of range. */
+inline int32_t trunc_sat32(double v) {
+    if (v >= 2147483647.0) return INT32_MAX;
+    if (v <= -2147483648.0) return INT32_MIN;
+    if (v != v) return 0;
+    return static_cast<int32_t>(v);
+}
+
+}  // namespace kova::dsp
+
+#endif
