@@ -12,6 +12,8 @@ namespace kova_host {
 namespace {
 
 constexpr long kNsPerSecond = 1'000'000'000;
+/* The highest rate the stand-in device accepts; above it a track fails like a real one. */
+constexpr uint32_t kMaxSampleRate = 192000;
 /* Falling further behind than this (a stalled process, a debugger) restarts the clock instead of
  * firing a storm of catch-up bursts. */
 constexpr long kMaxLagNs = 8 * TrackThread::kPeriodNs;
@@ -129,7 +131,8 @@ AudioTrack::AudioTrack(audio_stream_type_t, uint32_t sampleRate, audio_format_t 
     const int channels = std::popcount(channelMask);
     if (forced != NO_ERROR) {
         mStatus = forced;
-    } else if (format != AUDIO_FORMAT_PCM_16_BIT || channels < 1 || channels > 8) {
+    } else if (format != AUDIO_FORMAT_PCM_16_BIT || channels < 1 || channels > 8 ||
+               sampleRate > kova_host::kMaxSampleRate) {
         mStatus = BAD_VALUE;
     }
     if (mStatus != NO_ERROR || cbf == nullptr) return;

@@ -3,14 +3,19 @@
 #ifndef KOVA_FASTTRACK_H
 #define KOVA_FASTTRACK_H
 
-#include <utils/StrongPointer.h>
-
 #include "kova_types.h"
+
+/* After kova_types.h: this header uses uintptr_t without including <stdint.h>. */
+#include <utils/StrongPointer.h>
 
 namespace android {
 class AudioTrack;
 }
 
+/* Created by kova_open_fasttrack in zero-filled storage from the library's allocator and
+ * constructed in place (so `track` is a real null strong reference); only kova_close_fasttrack
+ * ends it. `state` is read by the callback without the lock and is therefore accessed atomically.
+ */
 struct KOVA_FASTTRACK {
     android::sp<android::AudioTrack> track;
     void* pBuffer; /* android::AudioTrack::Buffer* of the most recent callback */
