@@ -76,6 +76,7 @@ void TrackThread::stop() {
 }
 
 void TrackThread::pull_burst() {
+    if (device_held()) return;
     mBuffer.frameCount = mBurstFrames;
     mBuffer.size = mBurstBytes;
     mBuffer.raw = mRoom.data();

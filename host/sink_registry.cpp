@@ -47,6 +47,7 @@ std::unique_ptr<AudioSink> make_capture(uint32_t, uint32_t) {
 
 std::atomic<SinkFactory> g_factory{make_null};
 std::atomic<int32_t> g_fail_next{0};
+std::atomic<bool> g_hold{false};
 std::atomic<unsigned long> g_callbacks{0};
 std::atomic<unsigned long> g_underruns{0};
 
@@ -59,6 +60,10 @@ void use_sink_factory(SinkFactory factory) {
 std::unique_ptr<AudioSink> make_sink(uint32_t rate, uint32_t channels) {
     std::unique_ptr<AudioSink> sink = g_factory.load()(rate, channels);
     return sink ? std::move(sink) : std::make_unique<NullSink>();
+}
+
+bool device_held() {
+    return g_hold.load();
 }
 
 int32_t take_open_failure() {
@@ -133,6 +138,10 @@ unsigned long kova_host_callbacks(void) {
 void kova_host_reset_counters(void) {
     kova_host::g_underruns.store(0);
     kova_host::g_callbacks.store(0);
+}
+
+void kova_host_hold_device(int hold) {
+    kova_host::g_hold.store(hold != 0);
 }
 
 void kova_host_fail_next_open(int32_t status) {

@@ -15,6 +15,7 @@ std::unique_ptr<AudioSink> make_sink(uint32_t rate, uint32_t channels);
 /* The pending forced initCheck() status, consumed (0 when none). */
 int32_t take_open_failure();
 void count_callback(bool underrun);
+bool device_held();
 
 }  // namespace kova_host
 

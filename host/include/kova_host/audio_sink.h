@@ -32,6 +32,10 @@ unsigned long kova_host_underruns(void);
 unsigned long kova_host_callbacks(void);
 void kova_host_reset_counters(void);
 
+/* While held (non-zero), started tracks make no callbacks, like a stalled device; their clocks
+ * keep running. Lets tests fill and inspect a playing stream without the device draining it. */
+void kova_host_hold_device(int hold);
+
 /* The next track created reports `status` from initCheck() and gets no thread (a non-zero
  * status, e.g. -19 for a missing device). One-shot; 0 cancels. */
 void kova_host_fail_next_open(int32_t status);
