@@ -1,0 +1,200 @@
+// Editing a registered set's filters and files; refusal of degenerate descriptors.
+#include <gtest/gtest.h>
+#include <stdlib.h>
+
+#include <cmath>
+#include <cstring>
+#include <filesystem>
+#include <fstream>
+#include <string>
+#include <vector>
+
+#include "kova/kova.h"
+#include "util/kova_mem.h"
+
+namespace {
+
+constexpr KOVA_FLT_DSC kLow{KOVA_FLT_LOWPASS, 500.0, 0.0, 1, 48000, 2};
+constexpr KOVA_FLT_DSC kBand{KOVA_FLT_BANDPASS, 1000.0, 200.0, 1, 48000, 2};
+
+// A stereo sine of `hz` at 48 kHz, as raw bytes in a file of the temp dir.
+std::string write_sine(const std::string& dir, const std::string& name, double hz, int frames) {
+    std::vector<int16_t> s(frames * 2);
+    for (int i = 0; i < frames; ++i) {
+        s[2 * i] = s[2 * i + 1] = static_cast<int16_t>(8000 * std::sin(2 * M_PI * hz * i / 48000));
+    }
+    std::ofstream(dir + "/" + name, std::ios::binary)
+        .write(reinterpret_cast<const char*>(s.data()), static_cast<long>(s.size() * 2));
+    return dir + "/" + name;
+}
+
+double rms(const int16_t* s, int n) {
+    double acc = 0;
+    for (int i = n / 2; i < n; ++i) acc += double(s[i]) * s[i];  // past the filter's settling
+    return std::sqrt(acc / (n - n / 2));
+}
+
+struct Fixture : testing::Test {
+    std::string dir;
+    KOVA_CTX* ctx = nullptr;
+    int32_t err = 0;
+    void SetUp() override {
+        char t[] = "/tmp/kova_fltXXXXXX";
+        dir = mkdtemp(t);
+        KOVA_FORMAT f{48000, 2, 0, 0, 0};
+        ctx = kova_init(&f, &err);
+    }
+    void TearDown() override {
+        kova_deinit(ctx);
+        std::filesystem::remove_all(dir);
+    }
+    KOVA_SRCSET* set(int id) {
+        return static_cast<KOVA_SRCSET*>(list_getat(ctx->src_list, id - 1)->data);
+    }
+    const KOVA_FLT_DSC& filter(int id, uint32_t i) {
+        return *static_cast<KOVA_FLT_DSC*>(list_getat(set(id)->filters, i)->data);
+    }
+    static void expect_filtered(const KOVA_SRC* s, LIST* filters) {
+        std::vector<int16_t> ref(s->pcm, s->pcm + s->size / 2);
+        kova_proc_filters(ref.data(), s->size, filters);
+        EXPECT_EQ(0, memcmp(s->pcm_proc, ref.data(), s->size));
+        EXPECT_EQ(s->pos, 0);
+    }
+};
+
+}  // namespace
+
+TEST_F(Fixture, AttachReplacesSameTypeAndAppendsNewOnes) {
+    ASSERT_EQ(kova_reg_src_byfilter(ctx, &kLow, &err), 1);
+    KOVA_FLT_DSC low2 = kLow;
+    low2.freq = 3000.0;
+    EXPECT_EQ(kova_attach_filter(ctx, 1, &low2, &err), 1);
+    EXPECT_EQ(err, KOVA_OK);
+    ASSERT_EQ(set(1)->filters->count, 1u);
+    EXPECT_EQ(filter(1, 0).freq, 3000.0);
+    EXPECT_EQ(kova_attach_filter(ctx, 1, &kBand, &err), 1);
+    ASSERT_EQ(set(1)->filters->count, 2u);
+    EXPECT_EQ(filter(1, 0).type, KOVA_FLT_LOWPASS);
+    EXPECT_EQ(filter(1, 1).type, KOVA_FLT_BANDPASS);
+    expect_filtered(set(1)->src[KOVA_SLOT_LOOP], set(1)->filters);
+
+    // Only the types present are written.
+    KOVA_FLT_DSC out[4];
+    memset(out, 0x7F, sizeof(out));
+    const KOVA_FLT_DSC untouched = out[1];
+    EXPECT_EQ(kova_get_filters(ctx, 1, out), 0);
+    EXPECT_EQ(out[0].freq, 3000.0);
+    EXPECT_EQ(out[2].bandwidth, 200.0);
+    EXPECT_EQ(0, memcmp(&out[1], &untouched, sizeof(untouched)));
+    EXPECT_EQ(0, memcmp(&out[3], &untouched, sizeof(untouched)));
+    EXPECT_EQ(kova_get_filters(ctx, 2, out), 0);
+}
+
+TEST_F(Fixture, UpdateOfAbsentTypeIsRefusedWithALine) {
+    ASSERT_EQ(kova_reg_src_byfilter(ctx, &kLow, &err), 1);
+    const std::vector<int16_t> before(set(1)->src[1]->pcm_proc, set(1)->src[1]->pcm_proc + 96000);
+    testing::internal::CaptureStdout();
+    EXPECT_EQ(kova_update_filter(ctx, 1, &kBand, &err), 0);
+    EXPECT_EQ(testing::internal::GetCapturedStdout(), "kova_update_filterdsc() < 0 \n");
+    EXPECT_EQ(err, KOVA_ERR_INVALID_PARAM);
+    EXPECT_EQ(set(1)->filters->count, 1u);
+    EXPECT_EQ(0, memcmp(before.data(), set(1)->src[1]->pcm_proc, 192000));
+}
+
+TEST_F(Fixture, UpdateRereadsFilesAndRefiltersEverySource) {
+    const std::string s = write_sine(dir, "s.pcm", 300, 2000),
+                      l = write_sine(dir, "l.pcm", 300, 8000);
+    const char* paths[3] = {s.c_str(), l.c_str(), nullptr};
+    ASSERT_EQ(kova_reg_src_byfiles(ctx, paths, &err), 1);
+    ASSERT_EQ(kova_attach_filter(ctx, 1, &kLow, &err), 1);
+    const double low_level =
+        rms(set(1)->src[1]->pcm_proc, 16000);  // 300 Hz passes the 500 Hz low-pass
+    set(1)->src[0]->pos = 7;
+    set(1)->src[1]->pos = 11;
+
+    write_sine(dir, "l.pcm", 6000, 8000);  // the loop file changes on disk
+    KOVA_FLT_DSC low2 = kLow;
+    low2.freq = 400.0;
+    ASSERT_EQ(kova_update_filter(ctx, 1, &low2, &err), 1);
+    EXPECT_EQ(err, KOVA_OK);
+    for (int slot : {0, 1}) expect_filtered(set(1)->src[slot], set(1)->filters);
+    std::vector<char> disk(32000);
+    std::ifstream(l, std::ios::binary).read(disk.data(), 32000);
+    EXPECT_EQ(0, memcmp(set(1)->src[1]->pcm, disk.data(), 32000));
+    // 6 kHz lies far in the 400 Hz low-pass's stop band.
+    EXPECT_GT(low_level, 0.8 * 0.9 * 8000 / std::sqrt(2.0));
+    EXPECT_LT(rms(set(1)->src[1]->pcm_proc, 16000), 0.02 * low_level);
+}
+
+TEST_F(Fixture, ReplacingFilesKeepsOtherSlotsAndReportsAnEmptyLoop) {
+    ASSERT_EQ(kova_reg_src_byfilter(ctx, &kLow, &err), 1);
+    const std::string s = write_sine(dir, "s.pcm", 300, 1000);
+    const char* add_start[3] = {s.c_str(), nullptr, nullptr};
+    EXPECT_EQ(kova_update_src_byfiles(ctx, 1, add_start, &err), 1);
+    EXPECT_EQ(err, KOVA_OK);
+    EXPECT_EQ(set(1)->src[0]->size, 4000);
+    EXPECT_EQ(set(1)->src[1]->origin, KOVA_ORIGIN_NOISE);
+    for (int slot : {0, 1}) expect_filtered(set(1)->src[slot], set(1)->filters);  // not twice
+    EXPECT_EQ(set(1)->tune->file_gain, 0.4);
+    EXPECT_EQ(set(1)->tune->wn_gain, 0.0);
+
+    const std::string missing = dir + "/none.pcm";
+    const char* bad_loop[3] = {nullptr, missing.c_str(), nullptr};
+    EXPECT_EQ(kova_update_src_byfiles(ctx, 1, bad_loop, &err), 0);
+    EXPECT_EQ(err, KOVA_ERR_SOURCE);
+    EXPECT_EQ(set(1)->src[1], nullptr);
+    EXPECT_EQ(kova_get_src_num(ctx), 1);  // the set stays registered
+    EXPECT_EQ(kova_update_src_byfiles(ctx, 2, add_start, &err), 0);
+    EXPECT_EQ(err, KOVA_ERR_INVALID_PARAM);
+}
+
+TEST_F(Fixture, DegenerateDescriptorsAndFailuresLeaveTheContextAlone) {
+    ASSERT_EQ(kova_reg_src_byfilter(ctx, &kLow, &err), 1);
+    const std::vector<int16_t> before(set(1)->src[1]->pcm_proc, set(1)->src[1]->pcm_proc + 96000);
+    std::vector<KOVA_FLT_DSC> bad(14, kBand);
+    bad[0].type = 4;
+    bad[1].samplerate = 0;
+    bad[2].samplerate = -48000;
+    bad[3].samplerate = 400000;
+    bad[4].freq = 0.0;
+    bad[5].freq = 24000.0;  // Nyquist
+    bad[6].freq = NAN;
+    bad[7].bandwidth = 0.0;
+    bad[8].bandwidth = 24000.0;
+    bad[9].bandwidth = INFINITY;
+    bad[10].channels = 0;
+    bad[11].channels = 3;
+    bad[12] = kLow;
+    bad[12].freq = -1.0;
+    bad[13] = kLow;
+    bad[13].bandwidth = NAN;
+    for (const KOVA_FLT_DSC& d : bad) {
+        EXPECT_EQ(kova_reg_src_byfilter(ctx, &d, &err), 0);
+        EXPECT_EQ(err, KOVA_ERR_INVALID_PARAM);
+        err = 0;
+        EXPECT_EQ(kova_attach_filter(ctx, 1, &d, &err), 0);
+        EXPECT_EQ(err, KOVA_ERR_INVALID_PARAM);
+        err = 0;
+        EXPECT_EQ(kova_update_filter(ctx, 1, &d, &err), 0);
+        EXPECT_EQ(err, KOVA_ERR_INVALID_PARAM);
+    }
+    // Out of memory before anything changed.
+    for (auto op : {kova_attach_filter, kova_update_filter}) {
+        kova_mem_fail_after(0);
+        EXPECT_EQ(op(ctx, 1, &kLow, &err), 0);
+        kova_mem_fail_after(-1);
+        EXPECT_EQ(err, KOVA_ERR_INSUFF_MEM);
+    }
+    kova_mem_fail_after(1);  // path buffer granted, descriptor copy refused
+    EXPECT_EQ(kova_attach_filter(ctx, 1, &kBand, &err), 0);
+    kova_mem_fail_after(-1);
+    EXPECT_EQ(err, KOVA_ERR_INSUFF_MEM);
+    EXPECT_EQ(kova_update_filter(ctx, 2, &kLow, &err), 0);
+    EXPECT_EQ(kova_attach_filter(nullptr, 1, &kLow, &err), 0);
+
+    EXPECT_EQ(kova_get_src_num(ctx), 1);
+    EXPECT_EQ(ctx->active_src, 1);
+    ASSERT_EQ(set(1)->filters->count, 1u);
+    EXPECT_EQ(0, memcmp(&filter(1, 0), &kLow, sizeof(kLow)));
+    EXPECT_EQ(0, memcmp(before.data(), set(1)->src[1]->pcm_proc, 192000));
+}

@@ -1,0 +1,103 @@
+// Repeat points in milliseconds: conversions with known numbers, reading and storing them.
+#include <gtest/gtest.h>
+#include <stdlib.h>
+
+#include <filesystem>
+#include <fstream>
+#include <string>
+#include <vector>
+
+#include "kova/kova.h"
+
+namespace {
+
+KOVA_CTX* make_ctx(uint32_t rate, uint32_t channels) {
+    KOVA_FORMAT f{rate, channels, 0, 0, 0};
+    int32_t err = 1;
+    return kova_init(&f, &err);
+}
+
+KOVA_SRC* slot_src(KOVA_CTX* ctx, int id, int slot) {
+    return static_cast<KOVA_SRCSET*>(list_getat(ctx->src_list, id - 1)->data)->src[slot];
+}
+
+}  // namespace
+
+TEST(RepeatInfo, ConversionsGiveKnownNumbers) {
+    EXPECT_EQ(_cvt_ms_to_byte(100, 48000, 2), 19200);
+    EXPECT_EQ(_cvt_ms_to_byte(1, 44100, 1), 88);     // 88.2 truncated
+    EXPECT_EQ(_cvt_ms_to_byte(10, 44100, 2), 1764);  // 441 frames
+    EXPECT_EQ(_cvt_ms_to_byte(7, 44100, 2), 1232);   // 1234.8 -> 1234 -> whole frames
+    EXPECT_EQ(_cvt_ms_to_byte(5, 44100, 1), 440);    // 441 -> whole frames
+    EXPECT_EQ(_cvt_ms_to_byte(0, 48000, 2), 0);
+    EXPECT_EQ(_cvt_ms_to_byte(-5, 48000, 2), 0);
+    EXPECT_EQ(_cvt_byte_to_ms(38400, 48000, 2), 200);
+    EXPECT_EQ(_cvt_byte_to_ms(191, 48000, 1), 1);  // 1.98 truncated toward zero
+    EXPECT_EQ(_cvt_byte_to_ms(-191, 48000, 1), -1);
+    // Rates read from damaged files must not divide by zero or overflow.
+    EXPECT_EQ(_cvt_byte_to_ms(1000, 0, 2), 0);
+    EXPECT_EQ(_cvt_ms_to_byte(INT64_MAX, 48000, 2) % 4, 0);
+}
+
+TEST(RepeatInfo, FilterSetReportsOneSecondLoopAndEmptySlots) {
+    KOVA_CTX* ctx = make_ctx(48000, 2);
+    const KOVA_FLT_DSC lp{KOVA_FLT_LOWPASS, 1000.0, 0.0, 1, 48000, 2};
+    int32_t err = 0;
+    ASSERT_EQ(kova_reg_src_byfilter(ctx, &lp, &err), 1);
+    KOVA_RPT_INFO info;
+    memset(&info, 0x55, sizeof(info));
+    ASSERT_EQ(kova_get_rptinfo(ctx, 1, &info), 0);
+    for (int slot : {KOVA_SLOT_START, KOVA_SLOT_END}) {
+        EXPECT_EQ(info.len_ms[slot], 0);
+        EXPECT_EQ(info.rpt_start_ms[slot], -1);
+        EXPECT_EQ(info.rpt_end_ms[slot], -1);
+    }
+    EXPECT_EQ(info.len_ms[KOVA_SLOT_LOOP], 1000);
+    EXPECT_EQ(info.rpt_start_ms[KOVA_SLOT_LOOP], 0);
+    EXPECT_EQ(info.rpt_end_ms[KOVA_SLOT_LOOP], 1000);
+
+    EXPECT_EQ(kova_get_rptinfo(ctx, 2, &info), KOVA_ERR_INVALID_PARAM);
+    EXPECT_EQ(kova_get_rptinfo(ctx, 0, &info), KOVA_ERR_INVALID_PARAM);
+    EXPECT_EQ(kova_get_rptinfo(ctx, 1, nullptr), KOVA_ERR_INVALID_PARAM);
+    EXPECT_EQ(kova_get_rptinfo(nullptr, 1, &info), KOVA_ERR_INVALID_PARAM);
+    kova_deinit(ctx);
+}
+
+TEST(RepeatInfo, StoringKeepsValuesWithinTheSource) {
+    char tmpl[] = "/tmp/kova_rptXXXXXX";
+    const std::string dir = mkdtemp(tmpl), loop = dir + "/loop.pcm", start = dir + "/start.pcm";
+    std::vector<char> bytes(17640, 1);  // 100 ms at 44100 Hz stereo
+    std::ofstream(loop, std::ios::binary).write(bytes.data(), 17640);
+    std::ofstream(start, std::ios::binary).write(bytes.data(), 8820);  // 50 ms
+    KOVA_CTX* ctx = make_ctx(44100, 2);
+    const char* paths[3] = {start.c_str(), loop.c_str(), nullptr};
+    int32_t err = 0;
+    ASSERT_EQ(kova_reg_src_byfiles(ctx, paths, &err), 1);
+    KOVA_SRC* s = slot_src(ctx, 1, KOVA_SLOT_START);
+    KOVA_SRC* l = slot_src(ctx, 1, KOVA_SLOT_LOOP);
+
+    KOVA_RPT_INFO in{{0, 0, 0}, {-1, 5, 0}, {51, 10, 7}};
+    ASSERT_EQ(kova_set_rptinfo(ctx, 1, &in), 0);
+    EXPECT_EQ(s->rpt_start, 0);    // -1: unchanged
+    EXPECT_EQ(s->rpt_end, 8820);   // 51 ms > 50 ms length: unchanged
+    EXPECT_EQ(l->rpt_start, 880);  // 5 ms = 882 bytes, cut to whole frames
+    EXPECT_EQ(l->rpt_end, 1764);   // 10 ms = 441 frames
+    in = KOVA_RPT_INFO{{0, 0, 0}, {0, 100, 0}, {50, 0, 0}};
+    ASSERT_EQ(kova_set_rptinfo(ctx, 1, &in), 0);
+    EXPECT_EQ(s->rpt_end, 8820);  // equal to the length: the whole source
+    EXPECT_EQ(l->rpt_start, 17640);
+    EXPECT_EQ(l->rpt_end, 0);  // 0 ms stores 0 bytes, also for the loop slot
+
+    KOVA_RPT_INFO out{};
+    ASSERT_EQ(kova_get_rptinfo(ctx, 1, &out), 0);
+    EXPECT_EQ(out.len_ms[KOVA_SLOT_START], 50);
+    EXPECT_EQ(out.rpt_start_ms[KOVA_SLOT_LOOP], 100);
+    EXPECT_EQ(out.rpt_end_ms[KOVA_SLOT_END], -1);
+
+    EXPECT_EQ(kova_set_rptinfo(ctx, 2, &in), KOVA_ERR_INVALID_PARAM);
+    EXPECT_EQ(kova_set_rptinfo(ctx, 1, nullptr), KOVA_ERR_INVALID_PARAM);
+    EXPECT_EQ(kova_set_rptinfo(nullptr, 1, &in), KOVA_ERR_INVALID_PARAM);
+    EXPECT_EQ(l->rpt_end, 0);
+    kova_deinit(ctx);
+    std::filesystem::remove_all(dir);
+}
