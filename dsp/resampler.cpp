@@ -73,7 +73,10 @@ void _resample_s16_stereo_capped(int32_t numerator, int32_t denominator, const K
 
     const int32_t step = ratio_4_28(numerator, denominator);
     if (step == kOne) {
-        const int32_t bytes = in->size < out_capacity ? in->size : out_capacity;
+        /* A copy cut short by the capacity ends on a whole frame, so the next block does not
+         * start with the channels swapped. */
+        const int32_t bytes =
+            in->size <= out_capacity ? in->size : out_capacity / kFrameBytes * kFrameBytes;
         std::memmove(out->data, in->data, static_cast<size_t>(bytes));
         out->size = bytes;
         return;

@@ -1,0 +1,97 @@
+#include <gtest/gtest.h>
+
+#include <cmath>
+#include <cstdlib>
+#include <vector>
+
+#include "kova/kova_dsp.h"
+
+namespace {
+
+KOVA_EQ fresh() {
+    KOVA_EQ eq;
+    kova_eq_init(&eq, 880, 5000, 48000);
+    return eq;
+}
+
+// Output level of a sine relative to its input, measured after the equaliser has settled.
+double level_at(double thickness, double hz) {
+    KOVA_EQ eq = fresh();
+    kova_eq_set_thickness(&eq, thickness);
+    const double amp = 1e8;
+    double in2 = 0, out2 = 0;
+    for (int i = 0; i < 96000; ++i) {
+        double x = amp * std::sin(2 * M_PI * hz * i / 48000);
+        int32_t y = kova_eq_proc(&eq, static_cast<int32_t>(x));
+        if (i >= 48000) in2 += x * x, out2 += double(y) * y;
+    }
+    return std::sqrt(out2 / in2);
+}
+
+TEST(Equaliser, InitAndThicknessSetKnownValues) {
+    KOVA_EQ eq = fresh();
+    EXPECT_EQ(eq.low_coef, 0.11512805391913455);
+    EXPECT_EQ(eq.high_coef, 0.6428789306063232);
+    EXPECT_EQ(eq.low_gain, 1.0);
+    EXPECT_EQ(eq.high_gain, 1.0);
+    EXPECT_EQ(eq.slew_decay, 0.88);
+
+    struct Case {
+        double t, low, high, slew;
+    };
+    for (Case c : {Case{0, .6, 1.2, .7}, Case{1, 1.2, .6, 1.0}, Case{.5, .9, .9, .85},
+                   Case{2, 1.2, .6, 1.0}, Case{-1, .6, 1.2, .7}, Case{NAN, .6, 1.2, .7}}) {
+        EXPECT_EQ(kova_eq_set_thickness(&eq, c.t), &eq);
+        EXPECT_DOUBLE_EQ(eq.low_gain, c.low) << c.t;
+        EXPECT_EQ(eq.mid_gain, 1.0);
+        EXPECT_DOUBLE_EQ(eq.high_gain, c.high) << c.t;
+        EXPECT_DOUBLE_EQ(eq.slew_decay, c.slew) << c.t;
+    }
+    // 0.7 + 0.3 would round to just below 1; the factor above 0.3 gives exactly 1.
+    kova_eq_set_thickness(&eq, 1.0);
+    EXPECT_EQ(eq.slew_decay, 1.0);
+
+    kova_eq_init(nullptr, 880, 5000, 48000);
+    EXPECT_EQ(kova_eq_set_thickness(nullptr, 0.5), nullptr);
+}
+
+TEST(Equaliser, UnityGainsAreAThreeSampleDelay) {
+    KOVA_EQ eq = fresh();
+    std::srand(11);
+    std::vector<int32_t> in(2000);
+    for (int32_t& v : in) v = (std::rand() % 65536 - 32768) * 1000;
+    for (size_t i = 0; i < in.size(); ++i) {
+        int32_t expected = i < 3 ? 0 : in[i - 3];
+        ASSERT_LE(std::abs(int64_t(kova_eq_proc(&eq, in[i])) - expected), 1) << i;
+    }
+}
+
+TEST(Equaliser, ThicknessTradesLowBandAgainstHighBand) {
+    // At 50 Hz the low band carries nearly everything. At 15 kHz the output is
+    // high_gain * x + (1 - high_gain) * hs + (low_gain - 1) * ls with |hs| ~ 0.54 and |ls| < 0.06,
+    // which bounds the level to 1.07 .. 1.33 at thickness 0 and 0.37 .. 0.83 at thickness 1.
+    EXPECT_NEAR(level_at(0.0, 50), 0.6, 0.05);
+    EXPECT_NEAR(level_at(1.0, 50), 1.2, 0.05);
+    EXPECT_GT(level_at(0.0, 15000), 1.05);
+    EXPECT_LT(level_at(1.0, 15000), 0.85);
+}
+
+TEST(Equaliser, ConstantSettlesAtLowGainPlusBiasAndSaturates) {
+    // Steady state of each section: state = x + bias / coef.
+    KOVA_EQ eq = fresh();
+    kova_eq_set_thickness(&eq, 0.0);
+    const double x = 1e9 / 2147483647.0, bias = 2.3283064370807974e-10;
+    double expected =
+        (0.6 * x + (0.6 - 1) * bias / eq.low_coef + (1 - 1.2) * bias / eq.high_coef) * 2147483647.0;
+    int32_t y = 0;
+    for (int i = 0; i < 5000; ++i) y = kova_eq_proc(&eq, 1000000000);
+    EXPECT_NEAR(y, expected, 2);
+
+    kova_eq_set_thickness(&eq, 1.0);  // gain 1.2 pushes full scale past the 32-bit limit
+    for (int i = 0; i < 5000; ++i) y = kova_eq_proc(&eq, INT32_MAX);
+    EXPECT_EQ(y, INT32_MAX);
+    for (int i = 0; i < 5000; ++i) y = kova_eq_proc(&eq, INT32_MIN);
+    EXPECT_EQ(y, INT32_MIN);
+}
+
+}  // namespace

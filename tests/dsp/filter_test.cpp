@@ -1,0 +1,182 @@
+#include <gtest/gtest.h>
+
+#include <cmath>
+#include <cstdlib>
+#include <cstring>
+#include <vector>
+
+#include "kova/kova_dsp.h"
+#include "util/kova_mem.h"
+
+namespace {
+
+KOVA_FLT_DSC dsc(uint32_t type, double freq, double bw = 200, int32_t channels = 1) {
+    return KOVA_FLT_DSC{type, freq, bw, 1, 48000, channels};
+}
+
+KOVA_FLT* make(const KOVA_FLT_DSC& d) {
+    int32_t err = 99;
+    KOVA_FLT* f = kova_flt_init(&d, &err);
+    EXPECT_EQ(err, KOVA_OK);
+    return f;
+}
+
+std::vector<int16_t> filtered(const KOVA_FLT_DSC& d, std::vector<int16_t> pcm) {
+    KOVA_FLT* f = make(d);
+    EXPECT_EQ(kova_flt_process(f, pcm.data(), int32_t(pcm.size() * 2)), KOVA_OK);
+    kova_flt_deinit(f);
+    return pcm;
+}
+
+std::vector<int16_t> sine(double hz, int n, double amp = 16000) {
+    std::vector<int16_t> v(n);
+    for (int i = 0; i < n; ++i) v[i] = int16_t(amp * std::sin(2 * M_PI * hz * i / 48000));
+    return v;
+}
+
+double rms(const std::vector<int16_t>& v, size_t from) {
+    double s = 0;
+    for (size_t i = from; i < v.size(); ++i) s += double(v[i]) * v[i];
+    return std::sqrt(s / double(v.size() - from));
+}
+
+// Gain of the filter at `hz`, measured on a sine after settling, with the 0.9 output factor
+// removed.
+double gain(const KOVA_FLT_DSC& d, double hz) {
+    std::vector<int16_t> in = sine(hz, 96000);
+    return rms(filtered(d, in), 48000) / rms(in, 48000) / 0.9;
+}
+
+TEST(Filter, CoefficientsAt48k) {
+    KOVA_BIQUAD b{};
+    makefilter(&b, 48000, KOVA_FLT_LOWPASS, 1000, 0);
+    EXPECT_NEAR(b.c, 15.257051688, 1e-9);
+    EXPECT_NEAR(b.a0, 0.0039161267, 1e-10);
+    EXPECT_EQ(b.a1, 2 * b.a0);
+    EXPECT_NEAR(b.b1, -1.8153410827, 1e-10);
+    EXPECT_NEAR(b.b2, 0.8310055893, 1e-10);
+    makefilter(&b, 48000, KOVA_FLT_HIGHPASS, 1000, 0);
+    EXPECT_NEAR(b.c, 0.1310869256, 1e-10);
+    EXPECT_NEAR(b.a0, 0.8315533310, 1e-10);
+    EXPECT_EQ(b.a1, -2 * b.a0);
+    EXPECT_NEAR(b.b1, -1.6345281995, 1e-10);
+    EXPECT_NEAR(b.b2, 0.6916851244, 1e-10);
+    makefilter(&b, 48000, KOVA_FLT_BANDPASS, 1000, 200);
+    EXPECT_NEAR(b.d, 1.9828897227, 1e-10);
+    EXPECT_NEAR(b.a0, 0.0129215645, 1e-10);
+    EXPECT_EQ(b.a1, 0.0);
+    EXPECT_EQ(b.a2, -b.a0);
+    EXPECT_NEAR(b.b1, -1.9572676852, 1e-10);
+    EXPECT_NEAR(b.b2, 0.9741568709, 1e-10);
+    makefilter(&b, 48000, KOVA_FLT_BANDREJECT, 1000, 200);
+    EXPECT_NEAR(b.a0, 0.9870784355, 1e-10);
+    EXPECT_NEAR(b.a1, -1.9572676852, 1e-10);
+    EXPECT_EQ(b.b1, b.a1);
+    KOVA_BIQUAD before = b;
+    makefilter(&b, 48000, 4, 1000, 200);  // unknown type: nothing written
+    EXPECT_EQ(std::memcmp(&b, &before, sizeof b), 0);
+}
+
+TEST(Filter, MeasuredResponses) {
+    EXPECT_NEAR(gain(dsc(KOVA_FLT_LOWPASS, 1000), 1000), M_SQRT1_2, 0.005);
+    EXPECT_NEAR(gain(dsc(KOVA_FLT_HIGHPASS, 1000), 1991.5), M_SQRT1_2, 0.005);
+    EXPECT_LT(gain(dsc(KOVA_FLT_HIGHPASS, 1000), 1000), 0.3);  // cut-off is not at `freq`
+    EXPECT_NEAR(gain(dsc(KOVA_FLT_BANDPASS, 1000), 1000), 1.0, 0.005);
+    EXPECT_NEAR(gain(dsc(KOVA_FLT_BANDPASS, 1000), 1100), M_SQRT1_2, 0.03);  // band edge
+    EXPECT_LT(gain(dsc(KOVA_FLT_BANDREJECT, 1000), 1000), 0.005);
+    EXPECT_GT(gain(dsc(KOVA_FLT_BANDREJECT, 1000), 3000), 0.99);
+}
+
+TEST(Filter, ConstantInputSettles) {
+    std::vector<int16_t> dc(48000, 10000);
+    EXPECT_NEAR(filtered(dsc(KOVA_FLT_LOWPASS, 1000), dc).back(), 9000, 1);
+    EXPECT_NEAR(filtered(dsc(KOVA_FLT_BANDREJECT, 1000), dc).back(), 9000, 1);
+    EXPECT_EQ(filtered(dsc(KOVA_FLT_HIGHPASS, 1000), dc).back(), 0);
+    EXPECT_EQ(filtered(dsc(KOVA_FLT_BANDPASS, 1000), dc).back(), 0);
+    for (int16_t v : filtered(dsc(4, 1000), dc)) ASSERT_EQ(v, 0);  // unknown type: silence
+}
+
+TEST(Filter, OverflowWrapsInsteadOfClipping) {
+    // After a long run at -32768 the high-pass is at rest; a jump to 32767 gives y = a0 * 65535,
+    // and 0.9 of that lies above 32767, so the stored sample wraps to a negative value.
+    std::vector<int16_t> pcm(4800, -32768);
+    pcm.push_back(32767);
+    KOVA_FLT* f = make(dsc(KOVA_FLT_HIGHPASS, 1000));
+    const double a0 = f->biquad->a0;
+    kova_flt_process(f, pcm.data(), int32_t(pcm.size() * 2));
+    kova_flt_deinit(f);
+    EXPECT_NEAR(pcm.back(), int32_t(0.9 * a0 * 65535) - 65536, 1);
+}
+
+TEST(Filter, ChannelsAreIndependentAndStateCarriesAcrossCalls) {
+    std::vector<int16_t> left = sine(1000, 4800), right = sine(9000, 4800), st;
+    for (int i = 0; i < 4800; ++i) st.push_back(left[i]), st.push_back(right[i]);
+    st.push_back(1234);  // half a frame at the end stays untouched
+    KOVA_FLT_DSC d = dsc(KOVA_FLT_LOWPASS, 1000, 0, 2);
+
+    std::vector<int16_t> whole = filtered(d, st), split = st;
+    KOVA_FLT* f = make(d);
+    kova_flt_process(f, split.data(), 2 * 2 * 1001);
+    kova_flt_process(f, split.data() + 2 * 1001, int32_t(split.size() - 2 * 1001) * 2);
+    kova_flt_deinit(f);
+    EXPECT_EQ(split, whole);
+    EXPECT_EQ(whole.back(), 1234);
+
+    std::vector<int16_t> l = filtered(dsc(KOVA_FLT_LOWPASS, 1000), left);
+    std::vector<int16_t> r = filtered(dsc(KOVA_FLT_LOWPASS, 1000), right);
+    for (int i = 0; i < 4800; ++i) {
+        ASSERT_EQ(whole[2 * i], l[i]) << i;
+        ASSERT_EQ(whole[2 * i + 1], r[i]) << i;
+    }
+}
+
+TEST(Filter, ShortBuffersZeroChannelsAndBadHandles) {
+    int16_t two[2] = {1000, 2000};
+    KOVA_FLT* st = make(dsc(KOVA_FLT_LOWPASS, 1000, 0, 2));
+    EXPECT_EQ(kova_flt_process(st, two, 1), KOVA_OK);
+    EXPECT_EQ(kova_flt_process(st, two, 2), KOVA_OK);  // less than one stereo frame
+    KOVA_FLT* none = make(dsc(KOVA_FLT_LOWPASS, 1000, 0, 0));
+    EXPECT_EQ(kova_flt_process(none, two, 4), KOVA_OK);
+    EXPECT_EQ(two[0], 1000);
+    EXPECT_EQ(two[1], 2000);
+    EXPECT_EQ(none->dsc->enable, 0u);
+    EXPECT_EQ(st->self, st);
+
+    EXPECT_EQ(kova_flt_process(nullptr, two, 4), KOVA_ERR_INVALID_PARAM);
+    EXPECT_EQ(kova_flt_deinit(nullptr), KOVA_ERR_INVALID_PARAM);
+    st->tag = KOVA_OSC_TAG;
+    EXPECT_EQ(kova_flt_process(st, two, 4), KOVA_ERR_INVALID_PARAM);
+    EXPECT_EQ(kova_flt_deinit(st), KOVA_ERR_INVALID_PARAM);  // refused, so not freed
+    EXPECT_EQ(two[0], 1000);
+    st->tag = KOVA_FLT_TAG;
+    EXPECT_EQ(kova_flt_deinit(st), KOVA_OK);
+    EXPECT_EQ(kova_flt_deinit(none), KOVA_OK);
+
+    int32_t err = 99;
+    KOVA_FLT_DSC d = dsc(0, 1000);
+    EXPECT_EQ(kova_flt_init(nullptr, &err), nullptr);
+    EXPECT_EQ(err, 99);
+    EXPECT_EQ(kova_flt_init(&d, nullptr), nullptr);
+}
+
+TEST(Filter, AllocationFailureAtEveryStepReleasesAndReports) {
+    KOVA_FLT_DSC d = dsc(KOVA_FLT_BANDPASS, 1000, 200, 2);
+    for (long n = 0; n < 7; ++n) {  // context, descriptor, coefficients, four state arrays
+        int32_t err = 99;
+        testing::internal::CaptureStdout();
+        kova_mem_fail_after(n);
+        KOVA_FLT* f = kova_flt_init(&d, &err);
+        kova_mem_fail_after(-1);
+        EXPECT_EQ(testing::internal::GetCapturedStdout(),
+                  "KOVA_CTX malloc fail \nkova_flt_init() fail. err code (-2) \n");
+        EXPECT_EQ(f, nullptr) << n;
+        EXPECT_EQ(err, KOVA_ERR_INSUFF_MEM);
+    }
+    kova_mem_fail_after(7);
+    KOVA_FLT* f = make(d);
+    kova_mem_fail_after(-1);
+    ASSERT_NE(f, nullptr);
+    kova_flt_deinit(f);
+}
+
+}  // namespace

@@ -1,0 +1,116 @@
+#include <gtest/gtest.h>
+
+#include <cmath>
+#include <vector>
+
+#include "kova/kova_dsp.h"
+#include "util/kova_mem.h"
+
+namespace {
+
+std::vector<double> take(KOVA_OSC* osc, int n) {
+    std::vector<double> v;
+    for (int i = 0; i < n; ++i) v.push_back(kova_osc_get_sample(osc));
+    return v;
+}
+
+TEST(Oscillator, PeriodFollowsRateAndFrequencyAndStaysAtLeastOne) {
+    KOVA_OSC* osc = kova_osc_init(48000, 1, 0);
+    ASSERT_NE(osc, nullptr);
+    EXPECT_EQ(osc->self, osc);
+    EXPECT_EQ(osc->freq, 10.0);
+    EXPECT_EQ(osc->period, 4800);
+    EXPECT_EQ(kova_osc_set_freq(osc, 440.0), KOVA_OK);
+    EXPECT_EQ(osc->period, 109);
+    for (double f : {0.0, -5.0, double(NAN)}) {
+        kova_osc_set_freq(osc, f);
+        EXPECT_EQ(osc->freq, 1.0);
+        EXPECT_EQ(osc->period, 48000);
+    }
+    // At or above the sample rate the cycle is one sample: a constant, never a division by 0.
+    for (double f : {48000.0, 96000.0, double(INFINITY)}) {
+        kova_osc_set_freq(osc, f);
+        EXPECT_EQ(osc->period, 1);
+        EXPECT_EQ(take(osc, 3), (std::vector<double>{0.0, 0.0, 0.0}));
+    }
+    kova_osc_set_freq(osc, 1e-300);  // a period too long for 64 bits is bounded, not undefined
+    EXPECT_GT(osc->period, 0);
+    EXPECT_EQ(kova_osc_deinit(osc), KOVA_OK);
+}
+
+TEST(Oscillator, WaveformsAtKnownPhases) {
+    // 48000 / 12000 = period 4; 48000 / 9600 = period 5; 48000 / 6000 = period 8.
+    KOVA_OSC* sq = kova_osc_init(48000, 1, 1);
+    kova_osc_set_freq(sq, 12000.0);
+    EXPECT_EQ(take(sq, 5), (std::vector<double>{1, 1, -1, -1, 1}));
+    kova_osc_set_freq(sq, 9600.0);
+    EXPECT_EQ(take(sq, 5), (std::vector<double>{1, -1, -1, -1, 1}));  // phase 1 carried over
+
+    KOVA_OSC* saw = kova_osc_init(48000, 1, 2);
+    kova_osc_set_freq(saw, 6000.0);
+    EXPECT_EQ(take(saw, 9), (std::vector<double>{0, .25, .5, .75, -1, -.75, -.5, -.25, 0}));
+
+    KOVA_OSC* sine = kova_osc_init(48000, 1, 7);  // any other code is a sine
+    kova_osc_set_freq(sine, 6000.0);
+    std::vector<double> s = take(sine, 8);
+    for (int k = 0; k < 8; ++k) EXPECT_NEAR(s[k], std::sin(k * M_PI / 4), 1e-15) << k;
+    EXPECT_EQ(s[0], 0.0);
+    for (KOVA_OSC* o : {sq, saw, sine}) kova_osc_deinit(o);
+}
+
+TEST(Oscillator, StereoHandsOutEachValueTwice) {
+    KOVA_OSC* osc = kova_osc_init(48000, 2, 2);
+    kova_osc_set_freq(osc, 6000.0);
+    EXPECT_EQ(take(osc, 8), (std::vector<double>{0, 0, .25, .25, .5, .5, .75, .75}));
+    kova_osc_deinit(osc);
+}
+
+TEST(Oscillator, GenSamplesScalesToFullScaleAndLeavesOddByte) {
+    KOVA_OSC* sine = kova_osc_init(48000, 1, 0);
+    kova_osc_set_freq(sine, 12000.0);
+    int16_t buf[5] = {9, 9, 9, 9, 9};
+    EXPECT_EQ(kova_osc_gen_samples(sine, buf, 9), 4);
+    EXPECT_EQ(std::vector<int16_t>(buf, buf + 5), (std::vector<int16_t>{0, 32767, 0, -32767, 9}));
+    EXPECT_EQ(kova_osc_gen_samples(sine, buf, 1), 0);
+
+    KOVA_OSC* sq = kova_osc_init(8000, 1, 1);
+    int16_t big[2000];
+    EXPECT_EQ(kova_osc_gen_samples(sq, big, sizeof big), 2000);
+    for (int16_t v : big) ASSERT_TRUE(v == 32767 || v == -32767);
+    kova_osc_deinit(sine);
+    kova_osc_deinit(sq);
+}
+
+TEST(Oscillator, RefusesBadHandlesAndArgumentsWithoutChangingThem) {
+    int16_t buf[2] = {5, 5};
+    EXPECT_EQ(kova_osc_deinit(nullptr), KOVA_ERR_INVALID_PARAM);
+    EXPECT_EQ(kova_osc_set_freq(nullptr, 1.0), KOVA_ERR_INVALID_PARAM);
+    EXPECT_EQ(kova_osc_get_sample(nullptr), -3.0);
+    EXPECT_EQ(kova_osc_gen_samples(nullptr, buf, 4), KOVA_ERR_INVALID_PARAM);
+
+    KOVA_OSC* osc = kova_osc_init(48000, 1, 1);
+    EXPECT_EQ(kova_osc_gen_samples(osc, nullptr, 4), KOVA_ERR_INVALID_PARAM);
+    EXPECT_EQ(kova_osc_gen_samples(osc, buf, 0), KOVA_ERR_INVALID_PARAM);
+    osc->tag = 0x4B4F5641;  // the engine-context tag is not an oscillator's
+    EXPECT_EQ(kova_osc_set_freq(osc, 440.0), KOVA_ERR_INVALID_PARAM);
+    EXPECT_EQ(kova_osc_get_sample(osc), -3.0);
+    EXPECT_EQ(kova_osc_gen_samples(osc, buf, 4), KOVA_ERR_INVALID_PARAM);
+    EXPECT_EQ(kova_osc_deinit(osc), KOVA_ERR_INVALID_PARAM);  // not freed: ASan would see reuse
+    EXPECT_EQ(buf[0], 5);
+    EXPECT_EQ(osc->period, 4800);
+    EXPECT_EQ(osc->phase, 0);
+    osc->tag = KOVA_OSC_TAG;
+    EXPECT_EQ(kova_osc_deinit(osc), KOVA_OK);
+}
+
+TEST(Oscillator, AllocationFailureReportsAndReturnsNull) {
+    testing::internal::CaptureStdout();
+    kova_mem_fail_after(0);
+    KOVA_OSC* osc = kova_osc_init(48000, 2, 0);
+    kova_mem_fail_after(-1);
+    EXPECT_EQ(osc, nullptr);
+    EXPECT_EQ(testing::internal::GetCapturedStdout(),
+              "KOVA_CTX malloc fail \nkova_osc_init() fail. err code (KOVA_ERR_INSUFF_MEM) \n");
+}
+
+}  // namespace
