@@ -1,0 +1,311 @@
+// Generation: the worked move checked against a reference built from the documented per-sample
+// formulas, the pitch-raise path, clipping, panning, loop wrap, fast moves and the event rules.
+#include <gtest/gtest.h>
+
+#include <cmath>
+#include <vector>
+
+#include "engine_fixture.h"
+#include "kova/kova_dsp.h"
+#include "dsp/exact_math.h"
+
+namespace {
+
+using kova_test::event;
+using kova_test::gen;
+
+constexpr double kWorkedEnv = 14.016304347826086;
+constexpr double kWorkedStep = 0.004237078238224637;
+
+// A loop of 96000 samples (192000 bytes) whose values vary from sample to sample.
+std::vector<int16_t> varied_loop() {
+    std::vector<int16_t> s(96000);
+    for (size_t k = 0; k < s.size(); ++k) s[k] = static_cast<int16_t>((k * 37) % 2001) - 1000;
+    return s;
+}
+
+// Reference loop block: envelope climbing on even samples, gain, panning, equaliser (a fresh
+// one, as in a new context), loop wrap and optionally the slew limiter with decay 0.88.
+struct Ref {
+    double gain, e0, step, pan[2];
+    int32_t pos, loop_end, restart;
+    bool slew;
+};
+
+std::vector<int16_t> reference(const std::vector<int16_t>& loop, Ref r, int64_t count,
+                               int32_t* end_pos) {
+    KOVA_EQ eq;
+    kova_eq_init(&eq, 880, 5000, 48000);
+    std::vector<int16_t> out(static_cast<size_t>(count));
+    int32_t mem[2] = {0, 0};
+    double c = r.e0;
+    for (int64_t i = 0; i < count; ++i) {
+        if (i % 2 == 0) c += r.step;
+        const double v = r.gain * loop[static_cast<size_t>(r.pos++)] * c * 1.0 * r.pan[i % 2];
+        int32_t d = kova_eq_proc(&eq, static_cast<int32_t>(v));
+        EXPECT_LT(std::abs(d), 32767) << "reference assumes no clipping";
+        if (r.pos >= r.loop_end) r.pos = r.restart;
+        if (r.slew) {
+            int32_t& m = mem[i % 2];
+            if (std::abs(m - d) >= 1000) d = m > d ? m - 1000 : m + 1000;
+            m = static_cast<int16_t>(static_cast<int32_t>(d * 0.88));
+        }
+        out[static_cast<size_t>(i)] = static_cast<int16_t>(d);
+    }
+    *end_pos = r.pos;
+    return out;
+}
+
+struct GenTest : testing::Test {
+    kova_test::CtxPtr ctx = kova_test::make_ctx(48000, 2, 1, 1080, 2280);
+    std::vector<int16_t> loop = varied_loop();
+    KOVA_SRCSET* set = nullptr;
+    std::vector<int16_t> buf = std::vector<int16_t>(40000);
+
+    void SetUp() override {
+        set = kova_test::add_set(ctx.get(), nullptr,
+                                 kova_test::make_src(KOVA_SLOT_LOOP, KOVA_ORIGIN_FILE, loop),
+                                 nullptr);
+    }
+    KOVA_SRC* loop_src() { return set->src[KOVA_SLOT_LOOP]; }
+    // The worked move: start at (100,100)@1000, move to (130,140)@1016.
+    int32_t worked_move() {
+        EXPECT_EQ(gen(ctx.get(), event(100, 100, 1000, KOVA_ACTION_START), buf), 0);
+        return gen(ctx.get(), event(130, 140, 1016, KOVA_ACTION_MOVE), buf);
+    }
+    Ref worked_ref(bool slew) {
+        const double q = 0.4 * (130.0f / 1080.0f);
+        return Ref{1.0 * 0.9 * 0.8 * 0.4,
+                   1.0,
+                   kWorkedStep,
+                   {1.0 - q, 1.0 - 0.4 + q},
+                   0,
+                   95996,
+                   47998,
+                   slew};
+    }
+};
+
+TEST_F(GenTest, WorkedMoveMatchesReference) {
+    ASSERT_EQ(worked_move(), 3072);
+    EXPECT_EQ(ctx->prev_env, kWorkedEnv);
+    EXPECT_EQ(ctx->fast_count, 0);
+    int32_t end_pos = 0;
+    const auto want = reference(loop, worked_ref(true), 1536, &end_pos);
+    EXPECT_EQ(std::vector<int16_t>(buf.begin(), buf.begin() + 1536), want);
+    EXPECT_EQ(loop_src()->pos, end_pos);
+
+    const KOVA_PARAM a = event(100, 100, 1000, 0), b = event(130, 140, 1016, 1);
+    double energy = 0;
+    EXPECT_EQ(_calc_envelope(&a, &b, &energy, ctx->norm), kWorkedEnv);
+    EXPECT_NEAR(energy, 1981.88, 0.005);
+    const KOVA_PARAM fast = event(430, 540, 1016, 1);  // 31.25 px/ms, clamped to 23
+    EXPECT_EQ(_calc_envelope(&a, &fast, &energy, 1.0), 65.0);
+    EXPECT_EQ(_calc_envelope(&b, &a, &energy, 1.0), 0.0);
+    EXPECT_EQ(_calc_distortion(3.0, 5.0), 5.0);
+}
+
+TEST_F(GenTest, PitchRaiseStagesAndResamples) {
+    EXPECT_EQ(_calc_sharpness(kWorkedEnv, 0.2f), 1.2603260908356826);
+    set->tune->sharp_enable = 1;
+    set->tune->sharpness = 0.2;
+    const int32_t bytes = worked_move();
+    // 1935 staged samples resampled from 48000 Hz to 38084 Hz, no slew limiting.
+    int32_t end_pos = 0;
+    auto staged = reference(loop, worked_ref(false), 1935, &end_pos);
+    std::vector<int16_t> want(4000);
+    const KOVA_PCMBUF in{staged.data(), 1935 * 2};
+    KOVA_PCMBUF out{want.data(), 0};
+    kova_resample_s16_stereo(48000, 38084, &in, &out);
+    ASSERT_GT(out.size, 3000);
+    ASSERT_EQ(bytes, out.size);
+    want.resize(static_cast<size_t>(out.size / 2));
+    EXPECT_EQ(std::vector<int16_t>(buf.begin(), buf.begin() + out.size / 2), want);
+    EXPECT_EQ(loop_src()->pos, 1935);
+
+    // Depth 0 gives ratio 1: straight into the caller's buffer, still without slew limiting.
+    set->tune->sharpness = 0.0;
+    loop_src()->pos = 0;
+    kova_eq_init(ctx->eq, 880, 5000, 48000);  // the reference starts from a fresh equaliser
+    ASSERT_EQ(worked_move(), 3072);
+    EXPECT_EQ(std::vector<int16_t>(buf.begin(), buf.begin() + 1536),
+              reference(loop, worked_ref(false), 1536, &end_pos));
+}
+
+TEST_F(GenTest, LoopWrapsAtRepeatEnd) {
+    ASSERT_EQ(gen(ctx.get(), event(100, 100, 1000, KOVA_ACTION_START), buf), 0);
+    loop_src()->pos = 95990;  // 6 samples before the loop end 95996
+    ASSERT_EQ(gen(ctx.get(), event(130, 140, 1016, KOVA_ACTION_MOVE), buf), 3072);
+    Ref r = worked_ref(true);
+    r.pos = 95990;
+    int32_t end_pos = 0;
+    EXPECT_EQ(std::vector<int16_t>(buf.begin(), buf.begin() + 1536),
+              reference(loop, r, 1536, &end_pos));
+    EXPECT_EQ(loop_src()->pos, 47998 + 1530);
+}
+
+TEST_F(GenTest, SixthFastMoveRestartsLoop) {
+    ASSERT_EQ(gen(ctx.get(), event(0, 0, 1000, KOVA_ACTION_START), buf), 0);
+    std::vector<int16_t> block(1536);
+    for (int k = 1; k <= 7; ++k) {  // 150 px in 16 ms: energy above 8000
+        ASSERT_EQ(gen(ctx.get(), event(150.0f * k, 0, 1000 + 16 * k, 1), block), 3072);
+        const int32_t want = k <= 5 ? 1536 * k : 47998 + 1536 * (k - 5);
+        EXPECT_EQ(loop_src()->pos, want) << "move " << k;
+    }
+}
+
+TEST_F(GenTest, TimeAndDistanceRules) {
+    auto& prev = *ctx->prev_param;
+    ASSERT_EQ(gen(ctx.get(), event(100, 100, 1000, KOVA_ACTION_START), buf), 0);
+    EXPECT_EQ(gen(ctx.get(), event(200, 100, 1002, 1), buf), 0);  // 2 ms
+    EXPECT_EQ(prev.time, 1002);
+    EXPECT_EQ(gen(ctx.get(), event(300, 100, 1202, 1), buf), 0);  // 200 ms
+    EXPECT_EQ(gen(ctx.get(), event(400, 100, 1205, 1), buf), 2 * 2 * 144);
+    EXPECT_EQ(gen(ctx.get(), event(500, 100, 1404, 1), buf), 2 * 2 * 9552);
+    EXPECT_EQ(gen(ctx.get(), event(600, 100, 1300, 1), buf), 0);  // earlier
+    EXPECT_EQ(prev.time, 1300);
+    EXPECT_EQ(gen(ctx.get(), event(602, 102, 1316, 1), buf), 0);  // 2 px each way
+    EXPECT_EQ(gen(ctx.get(), event(605, 102, 1332, 1), buf), 3072);
+}
+
+TEST_F(GenTest, StartAndEndSlots) {
+    // Empty start slot: nothing, yet the stroke is open and measured from the start event.
+    ctx->prev_env = 9.0;
+    ctx->slew_odd = 55;
+    EXPECT_EQ(gen(ctx.get(), event(10, 10, 500, KOVA_ACTION_START), buf), 0);
+    EXPECT_EQ(ctx->stroke, 1u);
+    EXPECT_EQ(ctx->prev_env, 1.0);
+    EXPECT_EQ(ctx->slew_odd, 0);
+    EXPECT_EQ(gen(ctx.get(), event(40, 10, 516, KOVA_ACTION_MOVE), buf), 3072);
+
+    // End with an empty end slot rewinds the loop and closes the stroke.
+    EXPECT_NE(loop_src()->pos, 0);
+    ctx->fast_count = 3;
+    EXPECT_EQ(gen(ctx.get(), event(40, 10, 530, KOVA_ACTION_END), buf), 0);
+    EXPECT_EQ(loop_src()->pos, 0);
+    EXPECT_EQ(ctx->stroke, 0u);
+    EXPECT_EQ(ctx->fast_count, 0);
+
+    // A move outside a stroke only opens one.
+    const double env = ctx->prev_env;
+    EXPECT_EQ(gen(ctx.get(), event(90, 10, 546, KOVA_ACTION_MOVE), buf), 0);
+    EXPECT_EQ(ctx->stroke, 1u);
+    EXPECT_EQ(ctx->prev_param->x, 90.0f);
+    EXPECT_EQ(ctx->prev_env, env);
+}
+
+// Start sound of a constant 10000 with panning depth 0.4: gain 1 * 0.6 * 0.8 * 0.4.
+TEST_F(GenTest, PanGainsFollowPosition) {
+    set->src[KOVA_SLOT_START] =
+        kova_test::make_src(KOVA_SLOT_START, KOVA_ORIGIN_FILE, std::vector<int16_t>(400, 10000));
+    const float xs[2] = {0.0f, 1080.0f};
+    for (float x : xs) {
+        ASSERT_EQ(gen(ctx.get(), event(x, 5, 1000, KOVA_ACTION_START), buf), 800);
+        const double left = x == 0 ? 1.0 : 0.6, right = x == 0 ? 0.6 : 1.0;
+        for (int i = 100; i < 400; i += 2) {  // the equaliser has settled
+            EXPECT_NEAR(buf[static_cast<size_t>(i)], 1920 * left, 1.0);
+            EXPECT_NEAR(buf[static_cast<size_t>(i) + 1], 1920 * right, 1.0);
+        }
+    }
+}
+
+// Overloads are replaced by rotating values, each side on its own, across calls and contexts.
+TEST(GenClipTest, ReplacementValuesRotate) {
+    int last_hi = 0, last_lo = 0, hi_seen = 0, lo_seen = 0;
+    // Every overload seen must be the successor of the previous one on its side.
+    auto check = [&](const std::vector<int16_t>& buf) {
+        for (int16_t v : buf) {
+            if (v > 30000) {
+                ASSERT_TRUE(v == 32517 || v == 32267 || v == 32017) << v;
+                if (last_hi != 0) {
+                    EXPECT_EQ(v, last_hi == 32017 ? 32517 : last_hi - 250);
+                }
+                last_hi = v;
+                ++hi_seen;
+            } else if (v < -30000) {
+                ASSERT_TRUE(v == -32519 || v == -32269 || v == -32019) << v;
+                if (last_lo != 0) {
+                    EXPECT_EQ(v, last_lo == -32019 ? -32519 : last_lo + 250);
+                }
+                last_lo = v;
+                ++lo_seen;
+            } else {
+                EXPECT_LE(std::abs(v), 1);  // only the equaliser's delay of a fresh context
+            }
+        }
+    };
+    for (int round = 0; round < 2; ++round) {
+        kova_test::CtxPtr ctx = kova_test::make_ctx(48000, 2, 0, 0, 0);
+        auto* set = kova_test::add_set(
+            ctx.get(), kova_test::make_src(0, KOVA_ORIGIN_FILE, std::vector<int16_t>(20, 32767)),
+            kova_test::make_src(1, KOVA_ORIGIN_FILE, std::vector<int16_t>(20, 0)),
+            kova_test::make_src(2, KOVA_ORIGIN_FILE, std::vector<int16_t>(20, -32768)));
+        set->tune->file_gain = 1.0;
+        kova_set_volume(ctx.get(), 10.0);
+        std::vector<int16_t> buf(20);
+        for (int call = 0; call < 2; ++call) {
+            ASSERT_EQ(gen(ctx.get(), event(0, 0, 1, KOVA_ACTION_START), buf), 40);
+            check(buf);
+            ASSERT_EQ(gen(ctx.get(), event(0, 0, 2, KOVA_ACTION_END), buf), 40);
+            check(buf);
+        }
+    }
+    EXPECT_GT(hi_seen, 60);
+    EXPECT_GT(lo_seen, 60);
+}
+
+// Refused requests return 0 and change neither the context, the loop nor the buffer.
+TEST_F(GenTest, RefusalsChangeNothing) {
+    ASSERT_EQ(gen(ctx.get(), event(100, 100, 1000, KOVA_ACTION_START), buf), 0);
+    ASSERT_EQ(gen(ctx.get(), event(130, 140, 1016, KOVA_ACTION_MOVE), buf), 3072);
+    const KOVA_CTX before = *ctx;
+    const KOVA_PARAM prev = *ctx->prev_param;
+    const int32_t pos = loop_src()->pos;
+    std::vector<int16_t> small(64, 0x5A5A);
+    KOVA_PCMBUF out{small.data(), 128};
+    const KOVA_PARAM good = event(170, 140, 1032, KOVA_ACTION_MOVE);
+    auto refused = [&](KOVA_CTX* c, const KOVA_PARAM* p, KOVA_PCMBUF* o) {
+        EXPECT_EQ(kova_gen_sounds(c, p, o), 0);
+        EXPECT_EQ(kova_gen_samples(c, p, o), 0);
+    };
+    KOVA_PARAM bad = good;
+    refused(nullptr, &good, &out);
+    refused(ctx.get(), nullptr, &out);
+    refused(ctx.get(), &good, nullptr);
+    for (auto mutate : std::vector<void (*)(KOVA_PARAM&)>{
+             [](KOVA_PARAM& p) { p.x = -1; }, [](KOVA_PARAM& p) { p.y = -0.5f; },
+             [](KOVA_PARAM& p) { p.time = -1; }, [](KOVA_PARAM& p) { p.action = 3; },
+             [](KOVA_PARAM& p) { p.x = NAN; }, [](KOVA_PARAM& p) { p.y = INFINITY; }}) {
+        bad = good;
+        mutate(bad);
+        refused(ctx.get(), &bad, &out);
+    }
+    KOVA_PCMBUF empty{small.data(), 0}, nodata{nullptr, 128};
+    refused(ctx.get(), &good, &empty);
+    refused(ctx.get(), &good, &nodata);
+    for (int32_t active : {0, 2, -1}) {
+        ctx->active_src = active;
+        refused(ctx.get(), &good, &out);
+    }
+    ctx->active_src = 1;
+    KOVA_SRC* saved = loop_src();
+    set->src[KOVA_SLOT_LOOP] = nullptr;  // a set without a loop source
+    refused(ctx.get(), &good, &out);
+    set->src[KOVA_SLOT_LOOP] = saved;
+    ctx->tag = 0;
+    refused(ctx.get(), &good, &out);
+    ctx->tag = KOVA_CTX_TAG;
+
+    EXPECT_EQ(ctx->stroke, before.stroke);
+    EXPECT_EQ(ctx->prev_env, before.prev_env);
+    EXPECT_EQ(ctx->fast_count, before.fast_count);
+    EXPECT_EQ(ctx->slew_odd, before.slew_odd);
+    EXPECT_EQ(ctx->slew_even, before.slew_even);
+    EXPECT_EQ(ctx->prev_param->time, prev.time);
+    EXPECT_EQ(ctx->prev_param->x, prev.x);
+    EXPECT_EQ(loop_src()->pos, pos);
+    EXPECT_EQ(small, std::vector<int16_t>(64, 0x5A5A));
+    EXPECT_EQ(kova_gen_sounds(ctx.get(), &good, &out), 128);  // still usable
+}
+
+}  // namespace
