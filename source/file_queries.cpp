@@ -123,10 +123,10 @@ KOVA_API int kova_get_filters_fromfile(const char* path, KOVA_FLT_DSC flt[KOVA_F
     if (dsc == nullptr) return KOVA_ERR_INSUFF_MEM;
     for (int32_t i = 0; i < q.count; ++i) {
         *dsc = KOVA_FLT_DSC{};
-        // Only whole descriptors of a known type name an element; a later one of the same
-        // type replaces an earlier one.
+        // Only the descriptors the set reader would keep name an element; a later one of the
+        // same type replaces an earlier one.
         if (_read_KOVA_FLT_DSC(q.file.handle(), q.file.mfal(), dsc) != kFltDscBytes) continue;
-        if (kova_is_valid_filter(dsc) != 1) continue;
+        if (!stored_filter_usable(*dsc)) continue;
         std::memcpy(&flt[dsc->type], dsc, sizeof(KOVA_FLT_DSC));
     }
     kova_mem_free(dsc);

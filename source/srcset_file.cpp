@@ -142,9 +142,9 @@ KOVA_API int kova_open_source(KOVA_SRCSET* set, const char* path) {
     for (int32_t i = 0; i < count; ++i) {
         auto* dsc = static_cast<KOVA_FLT_DSC*>(kova_mem_calloc(1, sizeof(KOVA_FLT_DSC)));
         if (dsc == nullptr) return KOVA_ERR_INSUFF_MEM;
-        // Only whole descriptors of a known type are kept: a record cut by the end of the file
-        // would carry a sample rate of 0, and a type of 4 or more names no filter.
-        if (_read_KOVA_FLT_DSC(h, m, dsc) != kFltDscBytes || kova_is_valid_filter(dsc) != 1) {
+        // Only whole, usable descriptors are kept: a record cut by the end of the file would
+        // carry a sample rate of 0, and a type of 4 or more names no filter.
+        if (_read_KOVA_FLT_DSC(h, m, dsc) != kFltDscBytes || !stored_filter_usable(*dsc)) {
             kova_mem_free(dsc);
             continue;
         }
