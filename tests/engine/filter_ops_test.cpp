@@ -9,6 +9,7 @@
 #include <string>
 #include <vector>
 
+#include "engine/engine_fixture.h"
 #include "kova/kova.h"
 #include "util/kova_mem.h"
 
@@ -36,18 +37,14 @@ double rms(const int16_t* s, int n) {
 
 struct Fixture : testing::Test {
     std::string dir;
-    KOVA_CTX* ctx = nullptr;
+    kova_test::CtxPtr owner = kova_test::make_ctx();
+    KOVA_CTX* ctx = owner.get();
     int32_t err = 0;
     void SetUp() override {
         char t[] = "/tmp/kova_fltXXXXXX";
         dir = mkdtemp(t);
-        KOVA_FORMAT f{48000, 2, 0, 0, 0};
-        ctx = kova_init(&f, &err);
     }
-    void TearDown() override {
-        kova_deinit(ctx);
-        std::filesystem::remove_all(dir);
-    }
+    void TearDown() override { std::filesystem::remove_all(dir); }
     KOVA_SRCSET* set(int id) {
         return static_cast<KOVA_SRCSET*>(list_getat(ctx->src_list, id - 1)->data);
     }
@@ -143,7 +140,10 @@ TEST_F(Fixture, ReplacingFilesKeepsOtherSlotsAndReportsAnEmptyLoop) {
     EXPECT_EQ(kova_update_src_byfiles(ctx, 1, bad_loop, &err), 0);
     EXPECT_EQ(err, KOVA_ERR_SOURCE);
     EXPECT_EQ(set(1)->src[1], nullptr);
-    EXPECT_EQ(kova_get_src_num(ctx), 1);  // the set stays registered
+    EXPECT_EQ(kova_get_src_num(ctx), 1);  // the set stays registered, but plays nothing
+    std::vector<int16_t> buf(48000);
+    EXPECT_EQ(kova_test::gen(ctx, kova_test::event(5, 5, 10, KOVA_ACTION_START), buf), 0);
+    EXPECT_EQ(kova_test::gen(ctx, kova_test::event(300, 5, 30, KOVA_ACTION_MOVE), buf), 0);
     EXPECT_EQ(kova_update_src_byfiles(ctx, 2, add_start, &err), 0);
     EXPECT_EQ(err, KOVA_ERR_INVALID_PARAM);
 }

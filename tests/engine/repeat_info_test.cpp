@@ -7,15 +7,10 @@
 #include <string>
 #include <vector>
 
+#include "engine/engine_fixture.h"
 #include "kova/kova.h"
 
 namespace {
-
-KOVA_CTX* make_ctx(uint32_t rate, uint32_t channels) {
-    KOVA_FORMAT f{rate, channels, 0, 0, 0};
-    int32_t err = 1;
-    return kova_init(&f, &err);
-}
 
 KOVA_SRC* slot_src(KOVA_CTX* ctx, int id, int slot) {
     return static_cast<KOVA_SRCSET*>(list_getat(ctx->src_list, id - 1)->data)->src[slot];
@@ -40,7 +35,8 @@ TEST(RepeatInfo, ConversionsGiveKnownNumbers) {
 }
 
 TEST(RepeatInfo, FilterSetReportsOneSecondLoopAndEmptySlots) {
-    KOVA_CTX* ctx = make_ctx(48000, 2);
+    auto owner = kova_test::make_ctx(48000, 2);
+    KOVA_CTX* ctx = owner.get();
     const KOVA_FLT_DSC lp{KOVA_FLT_LOWPASS, 1000.0, 0.0, 1, 48000, 2};
     int32_t err = 0;
     ASSERT_EQ(kova_reg_src_byfilter(ctx, &lp, &err), 1);
@@ -60,7 +56,6 @@ TEST(RepeatInfo, FilterSetReportsOneSecondLoopAndEmptySlots) {
     EXPECT_EQ(kova_get_rptinfo(ctx, 0, &info), KOVA_ERR_INVALID_PARAM);
     EXPECT_EQ(kova_get_rptinfo(ctx, 1, nullptr), KOVA_ERR_INVALID_PARAM);
     EXPECT_EQ(kova_get_rptinfo(nullptr, 1, &info), KOVA_ERR_INVALID_PARAM);
-    kova_deinit(ctx);
 }
 
 TEST(RepeatInfo, StoringKeepsValuesWithinTheSource) {
@@ -69,7 +64,8 @@ TEST(RepeatInfo, StoringKeepsValuesWithinTheSource) {
     std::vector<char> bytes(17640, 1);  // 100 ms at 44100 Hz stereo
     std::ofstream(loop, std::ios::binary).write(bytes.data(), 17640);
     std::ofstream(start, std::ios::binary).write(bytes.data(), 8820);  // 50 ms
-    KOVA_CTX* ctx = make_ctx(44100, 2);
+    auto owner = kova_test::make_ctx(44100, 2);
+    KOVA_CTX* ctx = owner.get();
     const char* paths[3] = {start.c_str(), loop.c_str(), nullptr};
     int32_t err = 0;
     ASSERT_EQ(kova_reg_src_byfiles(ctx, paths, &err), 1);
@@ -98,6 +94,5 @@ TEST(RepeatInfo, StoringKeepsValuesWithinTheSource) {
     EXPECT_EQ(kova_set_rptinfo(ctx, 1, nullptr), KOVA_ERR_INVALID_PARAM);
     EXPECT_EQ(kova_set_rptinfo(nullptr, 1, &in), KOVA_ERR_INVALID_PARAM);
     EXPECT_EQ(l->rpt_end, 0);
-    kova_deinit(ctx);
     std::filesystem::remove_all(dir);
 }

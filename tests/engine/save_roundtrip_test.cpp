@@ -10,6 +10,7 @@
 #include <string>
 #include <vector>
 
+#include "engine/engine_fixture.h"
 #include "kova/kova.h"
 
 namespace {
@@ -45,12 +46,6 @@ T at(const std::vector<char>& file, size_t off) {
     return v;
 }
 
-KOVA_CTX* make_ctx() {
-    KOVA_FORMAT f{48000, 2, 0, 0, 0};
-    int32_t err = 1;
-    return kova_init(&f, &err);
-}
-
 KOVA_SRCSET* set_of(KOVA_CTX* ctx, int id) {
     return static_cast<KOVA_SRCSET*>(list_getat(ctx->src_list, id - 1)->data);
 }
@@ -71,7 +66,8 @@ TEST(SaveSource, SavedSetRegistersAgainWithItsShape) {
     const std::vector<char> start = wave(2000, 1), loop = wave(40000, 2), end = wave(1200, 3);
     const std::string sp = dir.write("s.pcm", start), lp = dir.write("l.pcm", loop),
                       ep = dir.write("e.pcm", end), saved = dir.path + "/set.kova";
-    KOVA_CTX* a = make_ctx();
+    auto a_owner = kova_test::make_ctx();
+    KOVA_CTX* a = a_owner.get();
     const char* paths[3] = {sp.c_str(), lp.c_str(), ep.c_str()};
     const KOVA_FLT_DSC low{KOVA_FLT_LOWPASS, 3000.0, 0.0, 1, 48000, 2};
     const KOVA_FLT_DSC band{KOVA_FLT_BANDPASS, 1000.0, 400.0, 1, 48000, 2};
@@ -106,7 +102,8 @@ TEST(SaveSource, SavedSetRegistersAgainWithItsShape) {
     EXPECT_EQ(at<int32_t>(file, 112 + 40 * n + 44), 960);   // rpt_end 5 ms
     EXPECT_EQ(0, memcmp(file.data() + 160 + 40 * n, start.data(), start.size()));
 
-    KOVA_CTX* b = make_ctx();
+    auto b_owner = kova_test::make_ctx();
+    KOVA_CTX* b = b_owner.get();
     ASSERT_EQ(kova_reg_src_bysavefile(b, saved.c_str(), &err), 1);
     EXPECT_EQ(err, KOVA_OK);
     KOVA_SRCSET* sa = set_of(a, 1);
@@ -139,14 +136,13 @@ TEST(SaveSource, SavedSetRegistersAgainWithItsShape) {
         EXPECT_EQ(0, memcmp(y->pcm_proc, x->pcm_proc, x->size));
     }
     EXPECT_EQ(sa->src[KOVA_SLOT_LOOP]->rpt_start, 1920);
-    kova_deinit(b);
-    kova_deinit(a);
 }
 
 TEST(SaveSource, OverwritesWithoutTruncatingAndWritesOnlyPresentSlots) {
     TempDir dir;
     const std::string path = dir.write("old.kova", std::vector<char>(300000, '\xAB'));
-    KOVA_CTX* ctx = make_ctx();
+    auto ctx_owner = kova_test::make_ctx();
+    KOVA_CTX* ctx = ctx_owner.get();
     const KOVA_FLT_DSC low{KOVA_FLT_LOWPASS, 2000.0, 0.0, 1, 48000, 2};
     int32_t err = 0;
     ASSERT_EQ(kova_reg_src_byfilter(ctx, &low, &err), 1);
@@ -160,12 +156,12 @@ TEST(SaveSource, OverwritesWithoutTruncatingAndWritesOnlyPresentSlots) {
     EXPECT_EQ(at<int32_t>(file, 152 + 32), KOVA_SLOT_LOOP);
     EXPECT_EQ(0, memcmp(file.data() + 200, set_of(ctx, 1)->src[KOVA_SLOT_LOOP]->pcm, 192000));
     for (size_t i = 192200; i < file.size(); ++i) ASSERT_EQ(file[i], '\xAB') << i;
-    kova_deinit(ctx);
 }
 
 TEST(SaveSource, PathLimitsAndRefusals) {
     TempDir dir;
-    KOVA_CTX* ctx = make_ctx();
+    auto ctx_owner = kova_test::make_ctx();
+    KOVA_CTX* ctx = ctx_owner.get();
     const KOVA_FLT_DSC low{KOVA_FLT_LOWPASS, 2000.0, 0.0, 1, 48000, 2};
     int32_t err = 0;
     ASSERT_EQ(kova_reg_src_byfilter(ctx, &low, &err), 1);
@@ -187,5 +183,4 @@ TEST(SaveSource, PathLimitsAndRefusals) {
     EXPECT_EQ(kova_save_source(ctx, 2, p511.c_str()), KOVA_ERR_INVALID_PARAM);
     EXPECT_EQ(kova_save_source(ctx, 1, nullptr), KOVA_ERR_INVALID_PARAM);
     EXPECT_EQ(kova_save_source(nullptr, 1, p511.c_str()), KOVA_ERR_INVALID_PARAM);
-    kova_deinit(ctx);
 }
