@@ -1,0 +1,42 @@
+package com.corvane.audio;
+
+import java.util.List;
+
+/**
+ * Test access to the stand-in audio device and to the library's log lines (tag "kova_jni").
+ * Loading this class loads the hook library first and then the Kova library, so the lines of the
+ * library's load hook are captured; they are kept in {@link #LOAD_LINES}.
+ */
+final class KovaTestHooks {
+    static final List<String> LOAD_LINES;
+
+    static {
+        System.loadLibrary("KovaTestHooks");
+        takeLogLines();
+        try {
+            Class.forName("com.corvane.audio.Kova", true, KovaTestHooks.class.getClassLoader());
+        } catch (ClassNotFoundException e) {
+            throw new ExceptionInInitializerError(e);
+        }
+        LOAD_LINES = List.of(takeLogLines());
+    }
+
+    private KovaTestHooks() {}
+
+    /** Log lines written since the previous call. */
+    static List<String> logs() {
+        return List.of(takeLogLines());
+    }
+
+    static native void useCaptureSink();
+
+    static native void useNullSink();
+
+    static native void clearCapture();
+
+    static native long captureSize();
+
+    static native byte[] capture();
+
+    private static native String[] takeLogLines();
+}

@@ -1,0 +1,219 @@
+/* Load and unload hooks, instance creation and destruction, and the life of the registry lock. */
+#include "jni/jni_test_support.h"
+#include "kova_host/audio_sink.h"
+
+namespace {
+
+using jni_test::deinit;
+using jni_test::init_default;
+using jni_test::jni_lines;
+using Lines = std::vector<std::string>;
+
+const std::string kPid = std::to_string(getpid());
+
+class Lifecycle : public ::testing::Test {
+   protected:
+    void SetUp() override {
+        jni_test::reset_to_unloaded();
+        fake_jni::g_getenv_result = JNI_OK;
+        ASSERT_EQ(JNI_OnLoad(fake_jni::vm(), nullptr), JNI_VERSION_1_6);
+        cap.clear();
+    }
+    void TearDown() override {
+        kova_mem_fail_after(-1);
+        jni_test::reset_to_unloaded();
+    }
+    kova_test::LogCapture cap;
+};
+
+TEST(JniLoad, LoadHookCreatesLockAndRegistryOnceAndOnlyWithAnEnvironment) {
+    jni_test::reset_to_unloaded();
+    kova_test::LogCapture cap;
+    fake_jni::g_getenv_result = JNI_EDETACHED;
+    EXPECT_EQ(JNI_OnLoad(fake_jni::vm(), nullptr), JNI_ERR);
+    EXPECT_EQ(gpKovaMutex, nullptr);
+    EXPECT_EQ(pKOVAInfoIsInited, 0);
+    EXPECT_EQ(pKOVAInfo[0].pid, 0);
+    EXPECT_TRUE(jni_lines(cap).empty());
+
+    fake_jni::g_getenv_result = JNI_OK;
+    EXPECT_EQ(JNI_OnLoad(fake_jni::vm(), nullptr), 0x10006);
+    ASSERT_NE(gpKovaMutex, nullptr);
+    EXPECT_EQ(pKOVAInfoIsInited, 1);
+    for (const KovaInfo& slot : pKOVAInfo) {
+        EXPECT_EQ(slot.pid, -1);
+        EXPECT_EQ(slot.pInstance, nullptr);
+        EXPECT_EQ(slot.isUsed, 0);
+    }
+    EXPECT_EQ(jni_lines(cap), Lines{"KOVA_JNI_OnLoad(init)"});
+
+    // A second load keeps the lock and the slots.
+    pthread_mutex_t* lock = gpKovaMutex;
+    int marker = 0;
+    ASSERT_EQ(_KovaInfoAdd(77, &marker), 0);
+    cap.clear();
+    EXPECT_EQ(JNI_OnLoad(fake_jni::vm(), nullptr), 0x10006);
+    EXPECT_EQ(gpKovaMutex, lock);
+    EXPECT_EQ(pKOVAInfo[0].pid, 77);
+    EXPECT_EQ(pKOVAInfo[0].pInstance, reinterpret_cast<KovaInstance*>(&marker));
+    EXPECT_EQ(jni_lines(cap), Lines{"KOVA_JNI_OnLoad()"});
+    _KovaInfoDelbyKova(&marker);
+    jni_test::reset_to_unloaded();
+}
+
+TEST_F(Lifecycle, InitFillsTheFirstFreeSlotAndDeinitFreesIt) {
+    EXPECT_EQ(init_default(), 1);
+    EXPECT_EQ(init_default(), 2);
+    const KovaInfo& slot = pKOVAInfo[0];
+    EXPECT_EQ(slot.pid, getpid());
+    EXPECT_EQ(slot.isUsed, 1);
+    ASSERT_NE(slot.pInstance, nullptr);
+    const KovaInstance& inst = *slot.pInstance;
+    EXPECT_NE(inst.pCtx, nullptr);
+    EXPECT_NE(inst.pFastTrack, nullptr);
+    EXPECT_EQ(inst.pFastTrack->state, 0);  // left stopped
+    EXPECT_NE(inst.pcm.data, nullptr);
+    EXPECT_EQ(inst.pcm.size, 960000);
+    EXPECT_EQ(inst.curSrc, 0);
+    EXPECT_EQ(inst.format.sample_rate, 48000u);
+    EXPECT_EQ(inst.format.h, 2280u);
+    EXPECT_EQ(jni_lines(cap),
+              (Lines{"kova_init()", "kova_init(id:1,48000hz,2ch,p:1,w:1080,h:2280)", "kova_init()",
+                     "kova_init(id:2,48000hz,2ch,p:1,w:1080,h:2280)"}));
+
+    cap.clear();
+    EXPECT_EQ(deinit(1), 0);
+    EXPECT_EQ(jni_lines(cap), (Lines{"kova_deinit()", "kova_deinit(id:1, pid:" + kPid + ")"}));
+    EXPECT_EQ(pKOVAInfo[0].isUsed, 0);
+    EXPECT_EQ(pKOVAInfo[0].pid, -1);
+    EXPECT_EQ(init_default(), 1);
+}
+
+TEST_F(Lifecycle, DeinitOfBadIdsAndFreeSlotsKeepsTheLock) {
+    ASSERT_EQ(init_default(), 1);
+    pthread_mutex_t* lock = gpKovaMutex;
+    cap.clear();
+    for (jlong id : {0L, -5L, 21L}) EXPECT_EQ(deinit(id), -3) << id;
+    EXPECT_EQ(jni_lines(cap), (Lines{"kova_deinit()", "kova_deinit()", "kova_deinit()"}));
+    cap.clear();
+    EXPECT_EQ(deinit(2), 0);
+    EXPECT_EQ(jni_lines(cap), (Lines{"kova_deinit()", "instance is NULL. deinit() is failed."}));
+    EXPECT_EQ(gpKovaMutex, lock);
+
+    // A deinit that finds an instance destroys the lock; calls without a lock do not create one.
+    EXPECT_EQ(deinit(1), 0);
+    EXPECT_EQ(gpKovaMutex, nullptr);
+    EXPECT_EQ(deinit(1), 0);
+    EXPECT_EQ(Java_com_corvane_audio_Kova_set_1volume(fake_jni::env(), nullptr, 1, 0.5), -3);
+    EXPECT_EQ(gpKovaMutex, nullptr);
+    EXPECT_EQ(init_default(), 1);
+    ASSERT_NE(gpKovaMutex, nullptr);
+    EXPECT_EQ(pthread_mutex_trylock(gpKovaMutex), 0);  // created unlocked, left unlocked
+    pthread_mutex_unlock(gpKovaMutex);
+}
+
+TEST_F(Lifecycle, FailedInitReleasesEverythingAndLeavesNoSlot) {
+    EXPECT_EQ(Java_com_corvane_audio_Kova_init(fake_jni::env(), nullptr, 48000, 1, 1, 1080, 2280),
+              -1);
+    EXPECT_EQ(jni_lines(cap), (Lines{"kova_init()", "kova_init() is failed. error=-1"}));
+
+    cap.clear();
+    kova_host_fail_next_open(-19);
+    EXPECT_EQ(init_default(), 0);
+    EXPECT_EQ(jni_lines(cap), Lines{"kova_init()"});
+
+    // Every allocation of init failing in turn: 0 before the engine, -1 with -2 inside it. Leaks
+    // on any of these paths are reported by the leak checker of the sanitizer build.
+    jlong id = 0;
+    for (long n = 0; n < 200 && id < 1; ++n) {
+        cap.clear();
+        kova_mem_fail_after(n);
+        id = init_default();
+        kova_mem_fail_after(-1);
+        const Lines lines = jni_lines(cap);
+        ASSERT_FALSE(lines.empty());
+        EXPECT_EQ(lines[0], "kova_init()");
+        if (id == -1) {
+            EXPECT_EQ(lines, (Lines{"kova_init()", "kova_init() is failed. error=-2"}));
+        } else if (id == 0) {
+            EXPECT_EQ(lines, Lines{"kova_init()"});
+        }
+        if (id < 1) {
+            for (const KovaInfo& slot : pKOVAInfo) ASSERT_EQ(slot.isUsed, 0) << n;
+        }
+    }
+    EXPECT_EQ(id, 1);
+
+    // Without a lock and without memory, init fails and no lock appears.
+    EXPECT_EQ(deinit(1), 0);
+    kova_mem_fail_after(0);
+    EXPECT_EQ(init_default(), 0);
+    kova_mem_fail_after(-1);
+    EXPECT_EQ(gpKovaMutex, nullptr);
+}
+
+TEST_F(Lifecycle, RefusedTeardownKeepsTheSlotUntilARetrySucceeds) {
+    ASSERT_EQ(init_default(), 1);
+    KovaInstance* inst = pKOVAInfo[0].pInstance;
+    inst->pCtx->tag = 0;  // the engine no longer recognises the context
+    cap.clear();
+    EXPECT_EQ(deinit(1), -3);
+    EXPECT_EQ(jni_lines(cap), (Lines{"kova_deinit()", "kova_deinit(id:1) is already completed"}));
+    EXPECT_EQ(pKOVAInfo[0].isUsed, 1);
+    EXPECT_EQ(pKOVAInfo[0].pInstance, inst);
+    EXPECT_EQ(inst->pFastTrack, nullptr);
+    EXPECT_EQ(inst->pcm.data, nullptr);
+    EXPECT_EQ(inst->pcm.size, 960000);
+    EXPECT_NE(inst->pCtx, nullptr);
+    EXPECT_EQ(gpKovaMutex, nullptr);
+    // Without its buffer the instance generates nothing.
+    EXPECT_EQ(
+        Java_com_corvane_audio_Kova_gen_1tofasttrack(fake_jni::env(), nullptr, 1, 5, 5, 0, 0, 0),
+        0);
+
+    inst->pCtx->tag = KOVA_CTX_TAG;
+    cap.clear();
+    EXPECT_EQ(deinit(1), 0);
+    EXPECT_EQ(jni_lines(cap), (Lines{"kova_deinit()", "kova_deinit(id:1, pid:" + kPid + ")"}));
+    EXPECT_EQ(pKOVAInfo[0].isUsed, 0);
+}
+
+TEST_F(Lifecycle, DeinitOfAnInstanceWithoutContextReportsIt) {
+    ASSERT_EQ(init_default(), 1);
+    KovaInstance* inst = pKOVAInfo[0].pInstance;
+    ASSERT_EQ(kova_deinit(inst->pCtx), 0);
+    inst->pCtx = nullptr;
+    cap.clear();
+    EXPECT_EQ(deinit(1), -3);
+    EXPECT_EQ(jni_lines(cap), (Lines{"kova_deinit()", "kova_deinit() is failed. error=-3"}));
+    EXPECT_EQ(pKOVAInfo[0].pInstance, inst);
+    EXPECT_EQ(inst->pFastTrack, nullptr);
+    EXPECT_EQ(gpKovaMutex, nullptr);
+    _KovaInfoDelbyKova(inst);
+    kova_mem_free(inst);
+}
+
+TEST_F(Lifecycle, UnloadTearsDownLiveInstancesButKeepsRefusedOnes) {
+    ASSERT_EQ(init_default(), 1);
+    ASSERT_EQ(init_default(), 2);
+    KovaInstance* refused = pKOVAInfo[1].pInstance;
+    refused->pCtx->tag = 0;
+    pthread_mutex_t* lock = gpKovaMutex;
+    cap.clear();
+    JNI_OnUnload(fake_jni::vm(), nullptr);
+    EXPECT_EQ(jni_lines(cap),
+              (Lines{"KOVA_JNI_OnUnload()", "_KovaInfoDelAll()",
+                     "kova_deinit[0](pid:" + kPid + ") is finished successfully(all)",
+                     "kova_deinit[1](pid:" + kPid + ") is already completed(all)"}));
+    EXPECT_EQ(pKOVAInfo[0].isUsed, 0);
+    EXPECT_EQ(pKOVAInfo[1].isUsed, 1);
+    EXPECT_EQ(refused->pFastTrack, nullptr);
+    EXPECT_EQ(refused->pcm.data, nullptr);
+    // The sweep's own try-lock was released, and the lock itself survives.
+    EXPECT_EQ(gpKovaMutex, lock);
+    EXPECT_EQ(pthread_mutex_trylock(lock), 0);
+    pthread_mutex_unlock(lock);
+    refused->pCtx->tag = KOVA_CTX_TAG;
+}
+
+}  // namespace
