@@ -77,6 +77,8 @@ void TrackThread::stop() {
 
 void TrackThread::pull_burst() {
     if (device_held()) return;
+    // A callback that claims the burst without filling it plays silence, not the previous burst.
+    std::fill(mRoom.begin(), mRoom.end(), uint8_t{0});
     mBuffer.frameCount = mBurstFrames;
     mBuffer.size = mBurstBytes;
     mBuffer.raw = mRoom.data();

@@ -36,6 +36,14 @@ void kova_host_reset_counters(void);
  * keep running. Lets tests fill and inspect a playing stream without the device draining it. */
 void kova_host_hold_device(int hold);
 
+/* ALSA playback on a sound device (alsa_sink.cpp). The probe opens the playback device `device`
+ * ("default" when null) and closes it again: 0 when it can be opened, otherwise a negative ALSA
+ * error code and a one-line reason in `why` (up to cap - 1 characters). kova_host_use_alsa_sink
+ * probes the same way and, on success, selects the device for tracks created from now on; on
+ * failure the selection is unchanged. */
+int kova_host_alsa_probe(const char* device, char* why, size_t cap);
+int kova_host_use_alsa_sink(const char* device, char* why, size_t cap);
+
 /* The next track created reports `status` from initCheck() and gets no thread (a non-zero
  * status, e.g. -19 for a missing device). One-shot; 0 cancels. */
 void kova_host_fail_next_open(int32_t status);
