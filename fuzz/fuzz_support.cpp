@@ -1,0 +1,147 @@
+#include "fuzz_support.h"
+
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <cstdio>
+#include <cstdlib>
+#include <fstream>
+#include <iterator>
+
+#include "util/kova_mem.h"
+
+#if defined(__has_feature)
+#if __has_feature(address_sanitizer)
+#define KOVA_FUZZ_ASAN 1
+#endif
+#endif
+#if defined(__SANITIZE_ADDRESS__)
+#define KOVA_FUZZ_ASAN 1
+#endif
+#ifdef KOVA_FUZZ_ASAN
+#include <sanitizer/asan_interface.h>
+#endif
+
+namespace kova_fuzz {
+
+void fail(const char* what, const char* file, int line) {
+    std::fprintf(stderr, "property violated: %s (%s:%d)\n", what, file, line);
+    std::abort();
+}
+
+ScratchFile::ScratchFile(const char* tag) {
+    const char* dir = std::getenv("TMPDIR");
+    path_ = std::string(dir != nullptr && *dir != '\0' ? dir : "/tmp") + "/kova-fuzz-" +
+            std::to_string(getpid()) + "-" + tag;
+}
+
+ScratchFile::~ScratchFile() { remove(); }
+
+void ScratchFile::remove() const { unlink(path_.c_str()); }
+
+void ScratchFile::rewrite(const void* data, size_t size) const {
+    const int fd = open(path_.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0600);
+    FUZZ_CHECK(fd >= 0);
+    const auto* p = static_cast<const uint8_t*>(data);
+    while (size > 0) {
+        const ssize_t n = write(fd, p, size);
+        FUZZ_CHECK(n > 0);
+        p += n;
+        size -= static_cast<size_t>(n);
+    }
+    close(fd);
+}
+
+std::string ScratchFile::read() const {
+    std::ifstream in(path_, std::ios::binary);
+    return std::string(std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>());
+}
+
+namespace {
+// 8-byte aligned, so the guard after a buffer of even size starts on a shadow granule.
+alignas(16) uint8_t g_arena[GuardedPcm::kMaxBytes + 64];
+}  // namespace
+
+GuardedPcm::GuardedPcm(int32_t size) {
+    FUZZ_CHECK(size <= kMaxBytes);
+    const size_t bytes = size > 0 ? static_cast<size_t>(size) : 0;
+    // The samples start 2-byte aligned; an odd size leaves one spare byte, which joins the guard.
+    uint8_t* const end = g_arena + kMaxBytes;
+    uint8_t* const data = end - (bytes + 1) / 2 * 2;
+    guard_ = data + bytes;
+    guard_bytes_ = static_cast<size_t>(end - guard_) + kGuard;
+    std::memset(guard_, kGuardByte, guard_bytes_);
+#ifdef KOVA_FUZZ_ASAN
+    ASAN_POISON_MEMORY_REGION(guard_, guard_bytes_);
+#endif
+    buf_.data = reinterpret_cast<int16_t*>(data);
+    buf_.size = size;
+}
+
+GuardedPcm::~GuardedPcm() {
+#ifdef KOVA_FUZZ_ASAN
+    ASAN_UNPOISON_MEMORY_REGION(guard_, guard_bytes_);
+#endif
+}
+
+bool GuardedPcm::guard_intact() const {
+#ifdef KOVA_FUZZ_ASAN
+    ASAN_UNPOISON_MEMORY_REGION(guard_, guard_bytes_);
+#endif
+    bool intact = true;
+    for (size_t i = 0; i < guard_bytes_; ++i) intact = intact && guard_[i] == kGuardByte;
+#ifdef KOVA_FUZZ_ASAN
+    ASAN_POISON_MEMORY_REGION(guard_, guard_bytes_);
+#endif
+    return intact;
+}
+
+int32_t checked_gen(KOVA_CTX* ctx, const KOVA_PARAM& ev, int32_t buffer_bytes) {
+    GuardedPcm out(buffer_bytes);
+    const unsigned long allocs = kova_mem_alloc_count();
+    const int32_t bytes = kova_gen_sounds(ctx, &ev, out.buf());
+    FUZZ_CHECK(kova_mem_alloc_count() == allocs);  // the per-event path allocates nothing
+    FUZZ_CHECK(bytes >= 0);
+    FUZZ_CHECK(bytes % 2 == 0);  // whole 16-bit samples
+    FUZZ_CHECK(bytes <= (buffer_bytes > 0 ? buffer_bytes : 0));
+    FUZZ_CHECK(out.guard_intact());
+    return bytes;
+}
+
+int64_t checked_stroke(KOVA_CTX* ctx, int moves, int dt_ms, int32_t buffer_bytes) {
+    int64_t total = 0;
+    KOVA_PARAM ev{100.0f, 200.0f, 1000, 0.0f, KOVA_ACTION_START};
+    total += checked_gen(ctx, ev, buffer_bytes);
+    for (int i = 0; i < moves; ++i) {
+        ev.x += 7.0f + static_cast<float>(i % 5);
+        ev.y += 11.0f;
+        ev.time += dt_ms;
+        ev.action = KOVA_ACTION_MOVE;
+        total += checked_gen(ctx, ev, buffer_bytes);
+    }
+    ev.time += dt_ms;
+    ev.action = KOVA_ACTION_END;
+    total += checked_gen(ctx, ev, buffer_bytes);
+    return total;
+}
+
+bool same_tune(const KOVA_TUNE_SET& a, const KOVA_TUNE_SET& b) {
+    const auto f = [](const auto& x, const auto& y) { return std::memcmp(&x, &y, sizeof x) == 0; };
+    return f(a.gain, b.gain) && f(a.pan, b.pan) && f(a.osc_enable, b.osc_enable) &&
+           f(a.osc_depth, b.osc_depth) && f(a.sharp_enable, b.sharp_enable) &&
+           f(a.sharpness, b.sharpness) && f(a.wn_gain, b.wn_gain) &&
+           f(a.file_gain, b.file_gain) && f(a.start_gain, b.start_gain) &&
+           f(a.loop_gain, b.loop_gain) && f(a.end_gain, b.end_gain);
+}
+
+KOVA_FORMAT phone_format() { return KOVA_FORMAT{48000, 2, 1, 1080, 2280}; }
+
+Engine::Engine() : Engine(phone_format()) {}
+
+Engine::Engine(const KOVA_FORMAT& f) : format_(f) { ctx_ = kova_init(&format_, &err_); }
+
+Engine::~Engine() {
+    if (ctx_ != nullptr) FUZZ_CHECK(kova_deinit(ctx_) == KOVA_OK);
+}
+
+}  // namespace kova_fuzz

@@ -1,0 +1,131 @@
+// Helpers shared by the fuzz targets and the seed-corpus generator: a byte reader over the fuzz
+// input, scratch files, a guarded output buffer and a checked stroke through kova_gen_sounds.
+#ifndef KOVA_FUZZ_SUPPORT_H
+#define KOVA_FUZZ_SUPPORT_H
+
+#include <cstddef>
+#include <cstdint>
+#include <cstring>
+#include <string>
+
+#include "kova/kova.h"
+
+namespace kova_fuzz {
+
+// A violated property: print what and where, then abort so the fuzzer records the input.
+[[noreturn]] void fail(const char* what, const char* file, int line);
+#define FUZZ_CHECK(cond)                                               \
+    do {                                                               \
+        if (!(cond)) ::kova_fuzz::fail(#cond, __FILE__, __LINE__);     \
+    } while (0)
+
+// Consumes the fuzz input front to back; past the end every read yields zeros.
+class Bytes {
+   public:
+    Bytes(const uint8_t* data, size_t size) : p_(data), left_(size) {}
+    size_t left() const { return left_; }
+    bool empty() const { return left_ == 0; }
+    template <typename T>
+    T take() {
+        T value{};
+        const size_t n = left_ < sizeof(T) ? left_ : sizeof(T);
+        std::memcpy(&value, p_, n);  // the fuzz input is an image in machine byte order
+        p_ += n;
+        left_ -= n;
+        return value;
+    }
+    // Up to `n` bytes as a view; advances past them.
+    const uint8_t* span(size_t n, size_t* got) {
+        *got = n < left_ ? n : left_;
+        const uint8_t* at = p_;
+        p_ += *got;
+        left_ -= *got;
+        return at;
+    }
+
+   private:
+    const uint8_t* p_;
+    size_t left_;
+};
+
+// A file under the system's temporary directory, unique to this process and `tag`, removed when
+// the object goes away. rewrite() replaces the whole content.
+class ScratchFile {
+   public:
+    explicit ScratchFile(const char* tag);
+    ~ScratchFile();
+    ScratchFile(const ScratchFile&) = delete;
+    ScratchFile& operator=(const ScratchFile&) = delete;
+    void rewrite(const void* data, size_t size) const;
+    void remove() const;
+    const char* path() const { return path_.c_str(); }
+    // The current content (empty when the file does not exist).
+    std::string read() const;
+
+   private:
+    std::string path_;
+};
+
+// An output buffer of exactly `size` bytes (at most kMaxBytes) followed by guard bytes that must
+// stay untouched (poisoned for AddressSanitizer, checked by value otherwise). The buffers share one
+// arena, so only one may exist at a time.
+class GuardedPcm {
+   public:
+    static constexpr int32_t kMaxBytes = 1 << 20;
+    explicit GuardedPcm(int32_t size);
+    ~GuardedPcm();
+    GuardedPcm(const GuardedPcm&) = delete;
+    GuardedPcm& operator=(const GuardedPcm&) = delete;
+    KOVA_PCMBUF* buf() { return &buf_; }
+    bool guard_intact() const;
+
+   private:
+    static constexpr size_t kGuard = 32;
+    static constexpr uint8_t kGuardByte = 0xA5;
+    uint8_t* guard_;  // right after the last byte of the buffer
+    size_t guard_bytes_;
+    KOVA_PCMBUF buf_{};
+};
+
+// One generation call with every property an application relies on checked: the result is a
+// whole, non-negative byte count that fits the buffer, nothing beyond the buffer is written and
+// nothing is allocated. Returns the byte count.
+int32_t checked_gen(KOVA_CTX* ctx, const KOVA_PARAM& ev, int32_t buffer_bytes);
+
+// A realistic stroke: down, `moves` moves `dt_ms` apart along a diagonal, up; each call checked.
+// Returns the total bytes produced.
+int64_t checked_stroke(KOVA_CTX* ctx, int moves, int dt_ms, int32_t buffer_bytes);
+
+// The usual engine format: 48000 Hz stereo with position panning on a 1080 x 2280 screen.
+KOVA_FORMAT phone_format();
+
+// A context with phone_format() that deinitialises itself.
+class Engine {
+   public:
+    Engine();
+    explicit Engine(const KOVA_FORMAT& f);
+    ~Engine();
+    Engine(const Engine&) = delete;
+    Engine& operator=(const Engine&) = delete;
+    KOVA_CTX* ctx() const { return ctx_; }
+    int32_t init_error() const { return err_; }
+
+   private:
+    KOVA_FORMAT format_;
+    int32_t err_ = 0;
+    KOVA_CTX* ctx_;
+};
+
+// Bitwise equality of two records (so NaN payloads compare equal to themselves).
+template <typename T>
+bool same_bytes(const T& a, const T& b) {
+    return std::memcmp(&a, &b, sizeof(T)) == 0;
+}
+
+// Field-by-field bitwise equality of two tune sets; padding bytes (which a record read from a
+// file may carry anything in) do not count.
+bool same_tune(const KOVA_TUNE_SET& a, const KOVA_TUNE_SET& b);
+
+}  // namespace kova_fuzz
+
+#endif
