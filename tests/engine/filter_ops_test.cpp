@@ -35,7 +35,7 @@ double rms(const int16_t* s, int n) {
     return std::sqrt(acc / (n - n / 2));
 }
 
-struct Fixture : testing::Test {
+struct FilterOps : testing::Test {
     std::string dir;
     kova_test::CtxPtr owner = kova_test::make_ctx();
     KOVA_CTX* ctx = owner.get();
@@ -61,7 +61,7 @@ struct Fixture : testing::Test {
 
 }  // namespace
 
-TEST_F(Fixture, AttachReplacesSameTypeAndAppendsNewOnes) {
+TEST_F(FilterOps, AttachReplacesSameTypeAndAppendsNewOnes) {
     ASSERT_EQ(kova_reg_src_byfilter(ctx, &kLow, &err), 1);
     KOVA_FLT_DSC low2 = kLow;
     low2.freq = 3000.0;
@@ -87,7 +87,7 @@ TEST_F(Fixture, AttachReplacesSameTypeAndAppendsNewOnes) {
     EXPECT_EQ(kova_get_filters(ctx, 2, out), 0);
 }
 
-TEST_F(Fixture, UpdateOfAbsentTypeIsRefusedWithALine) {
+TEST_F(FilterOps, UpdateOfAbsentTypeIsRefusedWithALine) {
     ASSERT_EQ(kova_reg_src_byfilter(ctx, &kLow, &err), 1);
     const std::vector<int16_t> before(set(1)->src[1]->pcm_proc, set(1)->src[1]->pcm_proc + 96000);
     testing::internal::CaptureStdout();
@@ -98,7 +98,7 @@ TEST_F(Fixture, UpdateOfAbsentTypeIsRefusedWithALine) {
     EXPECT_EQ(0, memcmp(before.data(), set(1)->src[1]->pcm_proc, 192000));
 }
 
-TEST_F(Fixture, UpdateRereadsFilesAndRefiltersEverySource) {
+TEST_F(FilterOps, UpdateRereadsFilesAndRefiltersEverySource) {
     const std::string s = write_sine(dir, "s.pcm", 300, 2000),
                       l = write_sine(dir, "l.pcm", 300, 8000);
     const char* paths[3] = {s.c_str(), l.c_str(), nullptr};
@@ -123,7 +123,7 @@ TEST_F(Fixture, UpdateRereadsFilesAndRefiltersEverySource) {
     EXPECT_LT(rms(set(1)->src[1]->pcm_proc, 16000), 0.02 * low_level);
 }
 
-TEST_F(Fixture, ReplacingFilesKeepsOtherSlotsAndReportsAnEmptyLoop) {
+TEST_F(FilterOps, ReplacingFilesKeepsOtherSlotsAndReportsAnEmptyLoop) {
     ASSERT_EQ(kova_reg_src_byfilter(ctx, &kLow, &err), 1);
     const std::string s = write_sine(dir, "s.pcm", 300, 1000);
     const char* add_start[3] = {s.c_str(), nullptr, nullptr};
@@ -148,7 +148,7 @@ TEST_F(Fixture, ReplacingFilesKeepsOtherSlotsAndReportsAnEmptyLoop) {
     EXPECT_EQ(err, KOVA_ERR_INVALID_PARAM);
 }
 
-TEST_F(Fixture, DegenerateDescriptorsAndFailuresLeaveTheContextAlone) {
+TEST_F(FilterOps, DegenerateDescriptorsAndFailuresLeaveTheContextAlone) {
     ASSERT_EQ(kova_reg_src_byfilter(ctx, &kLow, &err), 1);
     const std::vector<int16_t> before(set(1)->src[1]->pcm_proc, set(1)->src[1]->pcm_proc + 96000);
     std::vector<KOVA_FLT_DSC> bad(14, kBand);
