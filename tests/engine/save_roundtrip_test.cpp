@@ -179,6 +179,12 @@ TEST(SaveSource, PathLimitsAndRefusals) {
     EXPECT_FALSE(std::filesystem::exists(p512));
     EXPECT_EQ(kova_save_source(ctx, 1, (dir.path + "/no/such.kova").c_str()), KOVA_ERR_SOURCE);
     EXPECT_EQ(kova_save_source(ctx, 1, dir.path.c_str()), KOVA_ERR_SOURCE);  // a directory
+    for (long n : {0, 1}) {  // path buffer, then handle cell
+        kova_mem_fail_after(n);
+        EXPECT_EQ(kova_save_source(ctx, 1, (dir.path + "/nomem.kova").c_str()), KOVA_ERR_SOURCE);
+        kova_mem_fail_after(-1);
+    }
+    EXPECT_FALSE(std::filesystem::exists(dir.path + "/nomem.kova"));
     EXPECT_EQ(kova_save_source(ctx, 0, p511.c_str()), KOVA_ERR_INVALID_PARAM);
     EXPECT_EQ(kova_save_source(ctx, 2, p511.c_str()), KOVA_ERR_INVALID_PARAM);
     EXPECT_EQ(kova_save_source(ctx, 1, nullptr), KOVA_ERR_INVALID_PARAM);
