@@ -19,8 +19,8 @@
 namespace kova_host {
 namespace {
 
-constexpr unsigned kLatencyUs = 60000;  /* the device buffer */
-constexpr unsigned kCushionBursts = 5;  /* silence queued at start: 20 ms */
+constexpr unsigned kLatencyUs = 60000; /* the device buffer */
+constexpr unsigned kCushionBursts = 5; /* silence queued at start: 20 ms */
 
 std::mutex g_device_lock;
 std::string g_device = "default";
@@ -44,7 +44,8 @@ class AlsaSink final : public AudioSink {
     AlsaSink(snd_pcm_t* pcm, uint32_t rate, uint32_t channels)
         : mPcm(pcm),
           mChannels(channels),
-          mBurstFrames(std::max<size_t>(1, static_cast<size_t>(rate) * TrackThread::kPeriodNs / 1'000'000'000)),
+          mBurstFrames(std::max<size_t>(
+              1, static_cast<size_t>(rate) * TrackThread::kPeriodNs / 1'000'000'000)),
           mSilence(mBurstFrames * channels, 0) {}
 
     ~AlsaSink() override { snd_pcm_close(mPcm); }

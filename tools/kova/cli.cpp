@@ -1,0 +1,93 @@
+#include "cli.h"
+
+#include <android/log.h>
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <charconv>
+
+namespace kova_tool {
+namespace {
+
+std::FILE* g_out = stdout;
+int g_saved_stdout = -1;
+
+}  // namespace
+
+void usage_error(const std::string& what) {
+    throw ToolError(kExitUsage, what);
+}
+
+void failure(const std::string& what) {
+    throw ToolError(kExitFailure, what);
+}
+
+std::FILE* out() {
+    return g_out;
+}
+
+void init_output() {
+    // The tool writes through a duplicate of the original standard output, so descriptor 1 can be
+    // pointed at /dev/null while library calls run.
+    std::fflush(stdout);
+    g_saved_stdout = dup(STDOUT_FILENO);
+    if (g_saved_stdout < 0) return;
+    std::FILE* f = fdopen(g_saved_stdout, "w");
+    if (f) g_out = f;
+    set_library_chatter(false);
+}
+
+void set_library_chatter(bool verbose) {
+    std::fflush(stdout);
+    if (verbose) {
+        if (g_saved_stdout >= 0) dup2(g_saved_stdout, STDOUT_FILENO);
+        __android_log_set_minimum_priority(ANDROID_LOG_DEBUG);
+        return;
+    }
+    int null_fd = open("/dev/null", O_WRONLY | O_CLOEXEC);
+    if (null_fd >= 0 && g_saved_stdout >= 0) {
+        dup2(null_fd, STDOUT_FILENO);
+    }
+    if (null_fd >= 0) close(null_fd);
+    // The output stream logs at debug level; a person running the tool wants warnings only.
+    __android_log_set_minimum_priority(ANDROID_LOG_WARN);
+}
+
+Args::Args(int argc, char** argv, int first) {
+    for (int i = first; i < argc; ++i) args_.emplace_back(argv[i]);
+}
+
+std::string_view Args::next() {
+    inline_value_ = nullptr;
+    current_ = args_[pos_++];
+    if (current_.rfind("--", 0) == 0) {
+        const size_t eq = current_.find('=');
+        if (eq != std::string::npos) {
+            inline_storage_ = current_.substr(eq + 1);
+            inline_value_ = &inline_storage_;
+            current_.resize(eq);
+        }
+    }
+    return current_;
+}
+
+std::string Args::value(std::string_view option) {
+    if (inline_value_) {
+        inline_value_ = nullptr;
+        return inline_storage_;
+    }
+    if (done()) usage_error(std::string(option) + " needs a value");
+    return args_[pos_++];
+}
+
+std::string quoted(std::string_view text) {
+    return "'" + std::string(text) + "'";
+}
+
+std::string num(double value) {
+    char buf[64];
+    auto res = std::to_chars(buf, buf + sizeof buf, value);
+    return std::string(buf, res.ptr);
+}
+
+}  // namespace kova_tool

@@ -1,0 +1,64 @@
+#include "savefile_check.h"
+
+#include <kova/kova_types.h>
+
+#include <cerrno>
+#include <cstring>
+#include <fstream>
+
+#include "cli.h"
+
+namespace kova_tool {
+namespace {
+
+/* Sets built by the engine hold one filter per type; a file may hold a few more, not thousands. */
+constexpr int32_t kMaxFilters = 64;
+constexpr int32_t kSlotMax[KOVA_SLOT_COUNT] = {KOVA_SLOT_START_MAX_BYTES, KOVA_SLOT_LOOP_MAX_BYTES,
+                                               KOVA_SLOT_END_MAX_BYTES};
+
+template <typename T>
+bool read_at(std::ifstream& in, std::streamoff pos, T& value) {
+    in.clear();
+    in.seekg(pos);
+    in.read(reinterpret_cast<char*>(&value), sizeof value);
+    return static_cast<size_t>(in.gcount()) == sizeof value;
+}
+
+}  // namespace
+
+void check_source_set_file(const std::string& path, bool need_loop) {
+    std::ifstream in(path, std::ios::binary);
+    if (!in) failure("cannot read source-set file " + quoted(path) + ": " + std::strerror(errno));
+    in.seekg(0, std::ios::end);
+    const std::streamoff size = in.tellg();
+    auto reject = [&](const std::string& why) {
+        failure(quoted(path) + " is not a source-set file (" + why + ")");
+    };
+    int32_t count = 0;
+    if (size < 4 || !read_at(in, 0, count)) reject("shorter than 4 bytes");
+    if (count < 0 || count > kMaxFilters)
+        reject("filter count " + std::to_string(count) + " outside 0.." +
+               std::to_string(kMaxFilters));
+    const std::streamoff info_at =
+        4 + 40LL * count + static_cast<std::streamoff>(sizeof(KOVA_TUNE_SET));
+    KOVA_SRC_INFO info{};
+    if (!read_at(in, info_at, info)) reject("it ends before its slot table");
+    std::streamoff pos = info_at + static_cast<std::streamoff>(sizeof info);
+    for (int s = 0; s < KOVA_SLOT_COUNT; ++s) {
+        if (info.has_src[s] != 1) continue;
+        KOVA_SRC rec{};
+        if (!read_at(in, pos, rec))
+            reject("it ends inside the record of slot " + std::to_string(s));
+        if (rec.size < 1 || rec.size > kSlotMax[s]) {
+            reject("slot " + std::to_string(s) + " claims " + std::to_string(rec.size) +
+                   " bytes, accepted 1.." + std::to_string(kSlotMax[s]));
+        }
+        pos += static_cast<std::streamoff>(sizeof rec) + rec.size;
+        if (pos > size) reject("slot " + std::to_string(s) + " runs past the end of the file");
+    }
+    if (need_loop && info.has_src[KOVA_SLOT_LOOP] != 1) {
+        failure(quoted(path) + " has no loop sound, so it cannot play a stroke");
+    }
+}
+
+}  // namespace kova_tool

@@ -1,0 +1,311 @@
+#include "sources.h"
+
+#include <kova/kova_engine.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cmath>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <memory>
+#include <vector>
+
+#include "builtin_sounds.h"
+#include "savefile_check.h"
+
+namespace kova_tool {
+namespace {
+
+constexpr uint32_t kSlotMax[KOVA_SLOT_COUNT] = {KOVA_SLOT_START_MAX_BYTES, KOVA_SLOT_LOOP_MAX_BYTES,
+                                                KOVA_SLOT_END_MAX_BYTES};
+
+/* The built-in loop: white noise through a band-pass from about 1 to 4 kHz, the scratch of a pen
+ * on paper. */
+constexpr double kBuiltinFilterHz = 2500.0;
+constexpr double kBuiltinFilterBandHz = 3000.0;
+
+/* A private folder for the built-in start and end sounds while the set is built: the engine
+ * registers sounds from files only. Removed with everything in it when the set is done. */
+class TempDir {
+   public:
+    TempDir() {
+        const char* base = std::getenv("TMPDIR");
+        std::string tmpl = std::string(base && *base ? base : "/tmp") + "/kova-XXXXXX";
+        std::vector<char> buf(tmpl.begin(), tmpl.end());
+        buf.push_back('\0');
+        if (!mkdtemp(buf.data()))
+            failure("cannot create a temporary folder: " + std::string(std::strerror(errno)));
+        path_ = buf.data();
+    }
+    ~TempDir() {
+        for (const std::string& f : files_) unlink(f.c_str());
+        rmdir(path_.c_str());
+    }
+    TempDir(const TempDir&) = delete;
+    TempDir& operator=(const TempDir&) = delete;
+
+    std::string write(const std::string& name, const std::vector<int16_t>& pcm) {
+        const std::string file = path_ + "/" + name;
+        files_.push_back(file);
+        std::FILE* f = std::fopen(file.c_str(), "wb");
+        const size_t n = f ? std::fwrite(pcm.data(), sizeof(int16_t), pcm.size(), f) : 0;
+        if (!f || n != pcm.size() || std::fclose(f) != 0) {
+            failure("cannot write the built-in sound " + quoted(file) + ": " +
+                    std::strerror(errno));
+        }
+        return file;
+    }
+
+   private:
+    std::string path_;
+    std::vector<std::string> files_;
+};
+
+/* A raw PCM input must be a readable, non-empty regular file; longer ones are cut by the slot. */
+void check_pcm_file(int slot, const std::string& path, const KOVA_FORMAT& fmt) {
+    struct stat st {};
+    if (stat(path.c_str(), &st) != 0) {
+        failure("cannot read " + std::string(slot_name(slot)) + " sound " + quoted(path) + ": " +
+                std::strerror(errno));
+    }
+    if (!S_ISREG(st.st_mode))
+        failure(std::string(slot_name(slot)) + " sound " + quoted(path) + " is not a file");
+    if (access(path.c_str(), R_OK) != 0) {
+        failure("cannot read " + std::string(slot_name(slot)) + " sound " + quoted(path) + ": " +
+                std::strerror(errno));
+    }
+    if (st.st_size == 0)
+        failure(std::string(slot_name(slot)) + " sound " + quoted(path) + " is empty");
+    if (static_cast<uint64_t>(st.st_size) > kSlotMax[slot]) {
+        const double ms = kSlotMax[slot] * 1000.0 / (2.0 * fmt.sample_rate * fmt.channels);
+        std::fprintf(
+            stderr, "kova: note: %s is %lld bytes; the %s slot keeps the first %u (%.0f ms)\n",
+            path.c_str(), static_cast<long long>(st.st_size), slot_name(slot), kSlotMax[slot], ms);
+    }
+}
+
+void check(int32_t code, const std::string& what) {
+    if (code != KOVA_OK) failure(what + ": " + library_error(code));
+}
+
+/* Slot paths for the engine: user files as given, "builtin" written to the temporary folder,
+ * empty ones null. */
+struct SlotPaths {
+    std::string path[KOVA_SLOT_COUNT];
+    const char* ptr[KOVA_SLOT_COUNT] = {nullptr, nullptr, nullptr};
+    bool any = false;
+};
+
+SlotPaths slot_paths(const SourceOptions& src, const KOVA_FORMAT& fmt, TempDir*& temp,
+                     std::unique_ptr<TempDir>& temp_owner) {
+    SlotPaths p;
+    for (int s = 0; s < KOVA_SLOT_COUNT; ++s) {
+        if (src.slot[s].empty()) continue;
+        if (src.slot[s] == kBuiltinSound) {
+            if (!temp) {
+                temp_owner = std::make_unique<TempDir>();
+                temp = temp_owner.get();
+            }
+            p.path[s] =
+                s == KOVA_SLOT_START
+                    ? temp->write("start.pcm",
+                                  builtin_start_sound(fmt.sample_rate, fmt.channels, kSlotMax[s]))
+                    : temp->write("end.pcm",
+                                  builtin_end_sound(fmt.sample_rate, fmt.channels, kSlotMax[s]));
+        } else {
+            check_pcm_file(s, src.slot[s], fmt);
+            p.path[s] = src.slot[s];
+        }
+        p.ptr[s] = p.path[s].c_str();
+        p.any = true;
+    }
+    return p;
+}
+
+void apply_repeats(Engine& engine, int32_t id, const std::vector<RepeatSpec>& repeats) {
+    if (repeats.empty()) return;
+    KOVA_RPT_INFO now{};
+    check(kova_get_rptinfo(engine.ctx(), id, &now), "reading the repeat points");
+    KOVA_RPT_INFO want{};
+    for (int s = 0; s < KOVA_SLOT_COUNT; ++s) want.rpt_start_ms[s] = want.rpt_end_ms[s] = -1;
+    for (const RepeatSpec& r : repeats) {
+        const std::string opt = std::string("--repeat ") + slot_name(r.slot);
+        const int64_t len = now.len_ms[r.slot];
+        if (len <= 0) usage_error(opt + ": the set has no " + slot_name(r.slot) + " sound");
+        const std::string range =
+            " is out of range (accepted: 0.." + std::to_string(len) + " ms, the sound's length)";
+        if (r.start_ms > len) usage_error(opt + " start " + std::to_string(r.start_ms) + range);
+        if (r.end_ms > len) usage_error(opt + " end " + std::to_string(r.end_ms) + range);
+        // A loop that ends before its first millisecond has nothing to repeat.
+        if (r.slot == KOVA_SLOT_LOOP && r.end_ms == 0) {
+            usage_error(opt + " end 0 is out of range (accepted: 1.." + std::to_string(len) +
+                        " ms)");
+        }
+        if (r.start_ms >= 0) want.rpt_start_ms[r.slot] = r.start_ms;
+        if (r.end_ms >= 0) want.rpt_end_ms[r.slot] = r.end_ms;
+    }
+    check(kova_set_rptinfo(engine.ctx(), id, &want), "setting the repeat points");
+}
+
+/* Oscillator and resampling pairs: a depth turns the effect on; on/off alone keeps the depth. The
+ * engine takes a pair only with its depth in 0..1, so a depth outside that (possible in a file)
+ * needs a new one. */
+void apply_pair(std::string_view name, std::string_view depth_name, const std::optional<bool>& on,
+                const std::optional<double>& depth, int32_t& enable, double& value) {
+    if (depth) {
+        enable = 1;
+        value = *depth;
+    } else if (on) {
+        enable = *on ? 1 : 0;
+        if (*on && !(value >= 0.0 && value <= 1.0)) {
+            usage_error(std::string(name) + " on: the set's " + std::string(depth_name) + " " +
+                        num(value) + " is out of range (accepted: 0..1); give " +
+                        std::string(depth_name) + " too");
+        }
+    }
+}
+
+void apply_tune(Engine& engine, int32_t id, const TuneOptions& t, const KOVA_TUNE_SET& base) {
+    KOVA_TUNE_SET tune = base;
+    auto take = [](const std::optional<double>& v, double& field) {
+        if (v) field = *v;
+    };
+    take(t.gain, tune.gain);
+    take(t.pan, tune.pan);
+    take(t.wn_gain, tune.wn_gain);
+    take(t.file_gain, tune.file_gain);
+    take(t.start_gain, tune.start_gain);
+    take(t.loop_gain, tune.loop_gain);
+    take(t.end_gain, tune.end_gain);
+    apply_pair("--osc", "--osc-depth", t.osc, t.osc_depth, tune.osc_enable, tune.osc_depth);
+    apply_pair("--sharp", "--sharpness", t.sharp, t.sharpness, tune.sharp_enable, tune.sharpness);
+    check(kova_set_tuneset(engine.ctx(), id, &tune), "setting the tune set");
+}
+
+}  // namespace
+
+Engine::Engine(const FormatOptions& opts) : format_(opts.format()) {
+    int32_t err = KOVA_OK;
+    ctx_ = kova_init(&format_, &err);
+    if (!ctx_) failure("the engine could not be created: " + library_error(err));
+}
+
+Engine::~Engine() {
+    if (ctx_) kova_deinit(ctx_);
+}
+
+std::string library_error(int32_t code) {
+    const char* what = "unknown error";
+    switch (code) {
+        case KOVA_ERR_INVALID_FORMAT:
+            what = "format rejected";
+            break;
+        case KOVA_ERR_INSUFF_MEM:
+            what = "out of memory";
+            break;
+        case KOVA_ERR_INVALID_PARAM:
+            what = "invalid parameter";
+            break;
+        case KOVA_ERR_SOURCE:
+            what = "sound source could not be loaded";
+            break;
+        case KOVA_ERR_SRC_FULL:
+            what = "too many source sets";
+            break;
+        default:
+            break;
+    }
+    return std::string(what) + " (library code " + std::to_string(code) + ")";
+}
+
+KOVA_FLT_DSC builtin_filter(const KOVA_FORMAT& format) {
+    KOVA_FLT_DSC d{};
+    d.type = KOVA_FLT_BANDPASS;
+    // Below 8 kHz of Nyquist the band is pulled down with it, so low rates still get a band.
+    d.freq = std::min(kBuiltinFilterHz, format.sample_rate * 0.25);
+    d.bandwidth = std::min(kBuiltinFilterBandHz, format.sample_rate * 0.3);
+    d.enable = 1;
+    d.samplerate = static_cast<int32_t>(format.sample_rate);
+    d.channels = static_cast<int32_t>(format.channels);
+    return d;
+}
+
+PreparedSet prepare_set(Engine& engine, const SetupOptions& setup) {
+    const KOVA_FORMAT& fmt = engine.format();
+    SourceOptions src = setup.source;
+    if (src.builtin()) {
+        FilterSpec f;
+        f.text = "builtin";
+        f.dsc = builtin_filter(fmt);
+        src.filters.push_back(f);
+        src.slot[KOVA_SLOT_START] = std::string(kBuiltinSound);
+        src.slot[KOVA_SLOT_END] = std::string(kBuiltinSound);
+    }
+    if (!src.set_path.empty())
+        check_source_set_file(src.set_path, src.slot[KOVA_SLOT_LOOP].empty());
+
+    std::unique_ptr<TempDir> temp_owner;
+    TempDir* temp = nullptr;
+    const SlotPaths paths = slot_paths(src, fmt, temp, temp_owner);
+
+    KOVA_CTX* ctx = engine.ctx();
+    PreparedSet set;
+    int32_t err = KOVA_OK;
+    size_t first_attached = 0;
+    bool replace_slots = false;
+    if (!src.set_path.empty()) {
+        set.id = kova_reg_src_bysavefile(ctx, src.set_path.c_str(), &err);
+        if (!set.id)
+            failure("cannot register source-set file " + quoted(src.set_path) + ": " +
+                    library_error(err));
+        replace_slots = paths.any;
+    } else if (!src.slot[KOVA_SLOT_LOOP].empty()) {
+        set.id = kova_reg_src_byfiles(ctx, paths.ptr, &err);
+        if (!set.id) failure("cannot register the PCM files: " + library_error(err));
+    } else {
+        set.id = kova_reg_src_byfilter(ctx, &src.filters[0].dsc, &err);
+        if (!set.id)
+            failure("cannot register filter " + quoted(src.filters[0].text) + ": " +
+                    library_error(err));
+        set.noise_loop = true;
+        first_attached = 1;
+        replace_slots = paths.any;
+    }
+
+    KOVA_TUNE_SET base{};
+    check(kova_get_tuneset(ctx, set.id, &base), "reading the tune set");
+    if (replace_slots) {
+        err = KOVA_OK;
+        if (!kova_update_src_byfiles(ctx, set.id, paths.ptr, &err)) {
+            failure("cannot load the start/loop/end sounds: " + library_error(err));
+        }
+        if (paths.ptr[KOVA_SLOT_LOOP]) {
+            // A new loop file takes the levels a file registration gives.
+            set.noise_loop = false;
+            check(kova_get_tuneset(ctx, set.id, &base), "reading the tune set");
+        }
+        // Otherwise the set keeps its levels: replacing only the start or end sound should not
+        // change how loud the loop plays.
+    }
+    for (size_t i = first_attached; i < src.filters.size(); ++i) {
+        err = KOVA_OK;
+        if (!kova_attach_filter(ctx, set.id, &src.filters[i].dsc, &err)) {
+            failure("cannot attach filter " + quoted(src.filters[i].text) + ": " +
+                    library_error(err));
+        }
+    }
+    temp_owner.reset();
+
+    check(kova_set_active_src(ctx, set.id), "selecting the source set");
+    apply_repeats(engine, set.id, src.repeats);
+    apply_tune(engine, set.id, setup.tune, base);
+    if (setup.level.thickness)
+        check(kova_set_thickness(ctx, *setup.level.thickness), "setting the thickness");
+    if (setup.level.volume) check(kova_set_volume(ctx, *setup.level.volume), "setting the volume");
+    return set;
+}
+
+}  // namespace kova_tool
