@@ -70,7 +70,7 @@ int32_t gen_once(KOVA_CTX* ctx, bool is_end, KOVA_PCMBUF* out, const GenBlock& b
         const double g = b.tune->gain * slot_gain * ctx->volume * b.level;
         const int16_t* pcm = src->pcm_proc;
         int16_t* data = out->data;
-        KOVA_EQ* eq = ctx->eq;
+        kova_gen::EqKernel eq(ctx->eq);
         for (int32_t i = 0; i < n; ++i) {
             const int16_t s = kova_gen::finish_sample(eq, g * pcm[i]);
             // Panning applies after finishing here; with unit gains this is the sample itself.

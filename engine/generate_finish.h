@@ -33,14 +33,77 @@ struct GenBlock {
     double pan_gain[2]; /* even (left) and odd (right) samples; 1.0 each when panning is off */
 };
 
+/* trunc_sat32 with the common in-range case tested first (one comparison instead of three). */
+inline int32_t trunc32(double v) {
+    if (__builtin_fabs(v) < 2147483647.0) [[likely]]
+        return static_cast<int32_t>(v);
+    return kova::dsp::trunc_sat32(v);
+}
+
+/* The thickness equaliser's per-sample step, operation for operation the same as kova_eq_proc,
+ * with its state held in locals for the length of a block and written back by store(). The
+ * generator runs every output sample through it; an opaque call per sample (state reloaded from
+ * memory, every floating register spilled around it) would cost about as much as the rest of
+ * the block. A test keeps it bit-identical to kova_eq_proc. */
+class EqKernel {
+   public:
+    explicit EqKernel(KOVA_EQ* eq)
+        : eq_(eq),
+          low_coef_(eq->low_coef),
+          low_state_(eq->low_state),
+          high_coef_(eq->high_coef),
+          high_state_(eq->high_state),
+          h0_(eq->hist[0]),
+          h1_(eq->hist[1]),
+          h2_(eq->hist[2]),
+          low_gain_(eq->low_gain),
+          mid_gain_(eq->mid_gain),
+          high_gain_(eq->high_gain) {}
+    EqKernel(const EqKernel&) = delete;
+    EqKernel& operator=(const EqKernel&) = delete;
+    ~EqKernel() { store(); }
+
+    int32_t proc(int32_t sample) {
+        constexpr double kFullScale = 2147483647.0;
+        constexpr double kStateBias = 2.3283064370807974e-10;
+        const double x = static_cast<double>(sample) / kFullScale;
+        low_state_ = low_state_ + (low_coef_ * (x - low_state_) + kStateBias);
+        high_state_ = high_state_ + (high_coef_ * (x - high_state_) + kStateBias);
+        const double delayed = h2_;
+        const double low = low_state_;
+        const double high = delayed - high_state_;
+        const double mid = delayed - (low + high);
+        const double y = (high * high_gain_ + (low * low_gain_ + mid * mid_gain_)) * kFullScale;
+        h2_ = h1_;
+        h1_ = h0_;
+        h0_ = x;
+        return trunc32(y);
+    }
+
+    /* Writes the filter state back to the record (the gains are only read). */
+    void store() const {
+        eq_->low_state = low_state_;
+        eq_->high_state = high_state_;
+        eq_->hist[0] = h0_;
+        eq_->hist[1] = h1_;
+        eq_->hist[2] = h2_;
+    }
+
+   private:
+    KOVA_EQ* eq_;
+    double low_coef_, low_state_, high_coef_, high_state_;
+    double h0_, h1_, h2_;
+    double low_gain_, mid_gain_, high_gain_;
+};
+
 /* Equaliser, then clipping with rotating replacement values, then 16 bits. */
-inline int16_t finish_sample(KOVA_EQ* eq, double v) {
-    int32_t r = kova_eq_proc(eq, kova::dsp::trunc_sat32(v));
-    if (r >= kClipHigh) {
+inline int16_t finish_sample(EqKernel& eq, double v) {
+    int32_t r = eq.proc(trunc32(v));
+    if (r >= kClipHigh) [[unlikely]] {
         if (clip_count_hi >= kClipWrap) clip_count_hi = 0;
         clip_count_hi = static_cast<int16_t>(clip_count_hi + kClipStep);
         r = kClipHigh - clip_count_hi;
-    } else if (r <= kClipLow) {
+    } else if (r <= kClipLow) [[unlikely]] {
         if (clip_count_lo >= kClipWrap) clip_count_lo = 0;
         clip_count_lo = static_cast<int16_t>(clip_count_lo + kClipStep);
         r = static_cast<int16_t>(kClipHigh + clip_count_lo);

@@ -84,52 +84,102 @@ struct LoopRun {
     double pan_gain[2];
 };
 
-// Reads `count` loop samples into dst, applying the climbing envelope (from c), the oscillator
-// and the finisher; with kSlew also the slew limiter on each parity's memory.
-template <bool kOsc, bool kSlew>
-void render(KOVA_CTX* ctx, LoopRun& run, double c, int16_t* dst, int64_t count) {
-    KOVA_EQ* eq = ctx->eq;
-    KOVA_OSC* osc = ctx->osc;
-    const int16_t* pcm = run.pcm;
-    const double gain = run.gain;
-    const double step = run.step;
-    const double decay = eq->slew_decay;
-    const int32_t loop_end = run.bounds.end;
-    const int32_t restart = run.bounds.restart;
-    int32_t pos = run.pos;
-    int16_t memory[2] = {ctx->slew_even, ctx->slew_odd};
-    for (int64_t i = 0; i < count; ++i) {
-        const int odd = static_cast<int>(i & 1);
-        const double o = kOsc ? kova_osc_get_sample(osc) : 1.0;
-        if (!odd) c = c + step;
+// Slew memory factor. The equaliser only ever sets 0.7..1.0; a foreign value outside -1..1 (or
+// NaN) could push the memory out of 16 bits, so it is held at 1.0, which keeps the sample.
+double usable_decay(double decay) {
+    return (decay >= -1.0 && decay <= 1.0) ? decay : 1.0;
+}
+
+// One output sample from the loop: envelope factor c, oscillator value o, pan gain of its
+// parity; with kSlew the slew limiter against that parity's memory.
+template <bool kSlew>
+struct SampleStep {
+    const int16_t* pcm;
+    double gain;
+    double decay;
+    int32_t loop_end;
+    int32_t restart;
+
+    [[gnu::always_inline]] inline int16_t operator()(kova_gen::EqKernel& eq, int32_t& pos, double c,
+                                                     double o, double pan, int16_t& memory) const {
         const int16_t s = pcm[pos];
         pos = pos + 1;
-        const double v = gain * s * c * o * run.pan_gain[odd];
-        int16_t d = kova_gen::finish_sample(eq, v);
+        int16_t d = kova_gen::finish_sample(eq, gain * s * c * o * pan);
         if (pos >= loop_end) pos = restart;
         if (kSlew) {
-            const int32_t m = memory[odd];
+            const int32_t m = memory;
             const int32_t diff = m - d;
             if (diff >= kSlewLimit || diff <= -kSlewLimit) {
                 d = static_cast<int16_t>(m > d ? m - kSlewLimit : m + kSlewLimit);
             }
-            memory[odd] = static_cast<int16_t>(kova::dsp::trunc_sat32(d * decay));
+            // |d * decay| <= 32768: the conversion is always defined.
+            memory = static_cast<int16_t>(static_cast<int32_t>(d * decay));
         }
-        dst[i] = d;
+        return d;
     }
-    run.pos = pos;
-    if (kSlew) {
-        ctx->slew_even = memory[0];
-        ctx->slew_odd = memory[1];
+};
+
+// Oscillator values are fetched a chunk at a time into this many slots on the stack, so the
+// sample loop itself makes no calls and keeps the equaliser state in registers. Even, so the
+// parities of every chunk line up with the whole block.
+constexpr int64_t kOscChunk = 256;
+
+// Per-block loop state that moves from one span to the next.
+struct SpanState {
+    double c;  // envelope factor
+    int32_t pos;
+    int16_t mem_even;
+    int16_t mem_odd;
+};
+
+// Renders `count` samples into dst, the envelope factor climbing by one step per pair (before
+// the even sample), the oscillator value o[i] per sample when kOsc. Written per pair so each
+// parity's pan gain and slew memory stay in registers.
+template <bool kOsc, bool kSlew>
+void render_span(kova_gen::EqKernel& eq, const SampleStep<kSlew>& one, const LoopRun& run,
+                 SpanState& st, const double* o, int16_t* dst, int64_t count) {
+    const double step = run.step;
+    const double pan_even = run.pan_gain[0];
+    const double pan_odd = run.pan_gain[1];
+    double c = st.c;
+    int32_t pos = st.pos;
+    int16_t mem_even = st.mem_even;
+    int16_t mem_odd = st.mem_odd;
+    int64_t i = 0;
+    for (; i + 1 < count; i += 2) {
+        c = c + step;
+        dst[i] = one(eq, pos, c, kOsc ? o[i] : 1.0, pan_even, mem_even);
+        dst[i + 1] = one(eq, pos, c, kOsc ? o[i + 1] : 1.0, pan_odd, mem_odd);
     }
+    if (i < count) {
+        c = c + step;
+        dst[i] = one(eq, pos, c, kOsc ? o[i] : 1.0, pan_even, mem_even);
+    }
+    st = SpanState{c, pos, mem_even, mem_odd};
 }
 
+// Renders a whole block from the loop source (the envelope starting at c), updating the play
+// position in run and, with kSlew, the context's slew memories.
 template <bool kSlew>
 void render_block(KOVA_CTX* ctx, bool osc_on, LoopRun& run, double c, int16_t* dst, int64_t count) {
-    if (osc_on) {
-        render<true, kSlew>(ctx, run, c, dst, count);
+    kova_gen::EqKernel eq(ctx->eq);
+    const SampleStep<kSlew> one{run.pcm, run.gain, usable_decay(ctx->eq->slew_decay),
+                                run.bounds.end, run.bounds.restart};
+    SpanState st{c, run.pos, ctx->slew_even, ctx->slew_odd};
+    if (!osc_on) {
+        render_span<false>(eq, one, run, st, nullptr, dst, count);
     } else {
-        render<false, kSlew>(ctx, run, c, dst, count);
+        double o[kOscChunk];
+        for (int64_t done = 0; done < count; done += kOscChunk) {
+            const int64_t len = (count - done < kOscChunk) ? count - done : kOscChunk;
+            for (int64_t k = 0; k < len; ++k) o[k] = kova_osc_get_sample(ctx->osc);
+            render_span<true>(eq, one, run, st, o, dst + done, len);
+        }
+    }
+    run.pos = st.pos;
+    if (kSlew) {
+        ctx->slew_even = st.mem_even;
+        ctx->slew_odd = st.mem_odd;
     }
 }
 

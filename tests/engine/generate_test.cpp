@@ -3,11 +3,13 @@
 #include <gtest/gtest.h>
 
 #include <cmath>
+#include <cstring>
+#include <random>
 #include <vector>
 
 #include "engine_fixture.h"
 #include "kova/kova_dsp.h"
-#include "dsp/exact_math.h"
+#include "engine/generate_finish.h"
 
 namespace {
 
@@ -252,6 +254,27 @@ TEST(GenClipTest, ReplacementValuesRotate) {
     }
     EXPECT_GT(hi_seen, 60);
     EXPECT_GT(lo_seen, 60);
+}
+
+// The generator's in-register equaliser step must stay bit-identical to kova_eq_proc, state
+// included, whatever the input and thickness.
+TEST(GenEqKernelTest, MatchesEqualiser) {
+    std::mt19937 rng(7);
+    KOVA_EQ lib, mine;
+    kova_eq_init(&lib, 880, 5000, 44100);
+    kova_eq_init(&mine, 880, 5000, 44100);
+    for (double t : {0.6, 0.0, 1.0, 0.35}) {
+        kova_eq_set_thickness(&lib, t);
+        kova_eq_set_thickness(&mine, t);
+        kova_gen::EqKernel k(&mine);
+        for (int i = 0; i < 5000; ++i) {
+            int32_t s = static_cast<int32_t>(rng());
+            if (i % 3 == 0) s /= 4000;  // mostly sample-sized values, some full-range
+            ASSERT_EQ(k.proc(s), kova_eq_proc(&lib, s)) << i;
+        }
+        k.store();
+        ASSERT_EQ(std::memcmp(&lib, &mine, sizeof(lib)), 0);
+    }
 }
 
 // Refused requests return 0 and change neither the context, the loop nor the buffer.
