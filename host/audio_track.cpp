@@ -87,7 +87,10 @@ void TrackThread::pull_burst() {
     {
         // A burst whose track was stopped while the callback ran is not played.
         std::lock_guard<std::mutex> guard(mLock);
-        if (!active_locked()) return;
+        if (!active_locked()) {
+            count_callback(false);
+            return;
+        }
     }
     count_callback(got < mBurstBytes);
     mSink->write(mRoom.data(), got);
