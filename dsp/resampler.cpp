@@ -107,8 +107,9 @@ void _resample_s16_stereo_capped(int32_t numerator, int32_t denominator, const K
         /* With fraction 0 the interpolation yields the left frame exactly, so there is no
          * separate branch for it; frame f + 1 always exists because f < last. */
         const int16_t* s = src + 2 * f;
-        dst[2 * n] = lerp(s[0], s[2], pos);
-        dst[2 * n + 1] = lerp(s[1], s[3], pos);
+        const int32_t l0 = s[0], r0 = s[1], l1 = s[2], r1 = s[3];
+        dst[2 * n] = lerp(l0, l1, pos);
+        dst[2 * n + 1] = lerp(r0, r1, pos);
         ++n;
 
         /* step < 7.0 and pos < 1.0, so the sum and the rounding offset stay below 2^31. */

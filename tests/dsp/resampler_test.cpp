@@ -43,6 +43,8 @@ TEST(FixedPoint, DivideRoundsHalfUpAndRefusesLargeQuotients) {
     EXPECT_EQ(calcDevide(1, -3), -89478485);
     EXPECT_EQ(calcDevide(384000, 48000), 0);
     EXPECT_EQ(calcDevide(5, 0), 0);
+    EXPECT_EQ(calcDevide(1, 1 << 29), 1);  // exact halves round up in magnitude
+    EXPECT_EQ(calcDevide(-3, 1 << 29), -2);
     EXPECT_EQ(calcDevide(INT_MIN, -1), 0);
     // Against round-half-up(|a / b| * 2^28) with the sign of a / b, in exact integer arithmetic.
     std::srand(3);
