@@ -75,9 +75,10 @@ struct SourceWalk {
         record->rpt_start = load<int32_t>(image, offsetof(KOVA_SRC, rpt_start));
         record->rpt_end = load<int32_t>(image, offsetof(KOVA_SRC, rpt_end));
         pos += r;
-        if (record->size < 0 || pos + record->size > INT32_MAX) return fail();
+        if (record->size < 0 || pos > INT32_MAX) return fail();
         *payload = static_cast<int32_t>(pos);
         pos += record->size;
+        lost = pos > INT32_MAX;  // the next record has no 32-bit offset
         return true;
     }
 
