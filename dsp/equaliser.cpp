@@ -54,6 +54,9 @@ KOVA_EQ* kova_eq_set_thickness(KOVA_EQ* eq, double thickness) {
 }
 
 int32_t kova_eq_proc(KOVA_EQ* eq, int32_t sample) {
+    /* Callers pass an initialised record; without one the sample passes through unchanged
+     * rather than crashing. */
+    if (eq == nullptr) return sample;
     const double x = static_cast<double>(sample) / kFullScale;
     eq->low_state = eq->low_state + (eq->low_coef * (x - eq->low_state) + kStateBias);
     eq->high_state = eq->high_state + (eq->high_coef * (x - eq->high_state) + kStateBias);

@@ -21,6 +21,35 @@ int16_t noise_sample() {
 constexpr int32_t kSlotBytes[KOVA_SLOT_COUNT] = {KOVA_SLOT_START_MAX_BYTES,
                                                  KOVA_SLOT_LOOP_MAX_BYTES, KOVA_SLOT_END_MAX_BYTES};
 
+/* A noise source for one slot, or null: for an unknown slot (code left as it is) or when memory
+ * is short (code set, nothing left allocated). */
+KOVA_SRC* new_noise_source(uint32_t slot, int32_t* err) {
+    if (slot >= KOVA_SLOT_COUNT) return nullptr;
+    const int32_t bytes = kSlotBytes[slot];
+    auto* src = static_cast<KOVA_SRC*>(kova_mem_calloc(1, sizeof(KOVA_SRC)));
+    if (src != nullptr) {
+        src->pcm_proc = static_cast<int16_t*>(kova_mem_malloc(static_cast<size_t>(bytes)));
+        if (src->pcm_proc != nullptr) {
+            src->pcm = static_cast<int16_t*>(kova_mem_malloc(static_cast<size_t>(bytes)));
+        }
+    }
+    if (src == nullptr || src->pcm == nullptr) {
+        if (src != nullptr) kova_mem_free(src->pcm_proc);
+        kova_mem_free(src);
+        *err = KOVA_ERR_INSUFF_MEM;
+        return nullptr;
+    }
+    src->slot = static_cast<int32_t>(slot);
+    src->origin = KOVA_ORIGIN_NOISE;
+    src->size = bytes;
+    src->pos = 0;
+    src->rpt_start = 0;
+    src->rpt_end = bytes;
+    kova_gen_white_noise_16bit(src->pcm, bytes);
+    std::memcpy(src->pcm_proc, src->pcm, static_cast<size_t>(bytes));
+    return src;
+}
+
 }  // namespace
 
 extern "C" {
@@ -36,34 +65,10 @@ KOVA_SRC* kova_gen_sound_source_wn(const KOVA_FLT_DSC* dsc, uint32_t slot, int32
     int32_t ignored = 0;
     if (err == nullptr) err = &ignored;
     *err = KOVA_ERR_SOURCE;
+    /* The descriptor is only required to exist: filtering is the caller's next step. */
     if (dsc == nullptr) return nullptr;
 
-    KOVA_SRC* src = nullptr;
-    if (slot < KOVA_SLOT_COUNT) {
-        src = static_cast<KOVA_SRC*>(kova_mem_calloc(1, sizeof(KOVA_SRC)));
-        if (src == nullptr) {
-            *err = KOVA_ERR_INSUFF_MEM;
-        } else {
-            const int32_t bytes = kSlotBytes[slot];
-            src->pcm_proc = static_cast<int16_t*>(kova_mem_malloc(static_cast<size_t>(bytes)));
-            src->pcm = src->pcm_proc ? static_cast<int16_t*>(kova_mem_malloc(bytes)) : nullptr;
-            if (src->pcm == nullptr) {
-                kova_mem_free(src->pcm_proc);
-                kova_mem_free(src);
-                src = nullptr;
-                *err = KOVA_ERR_INSUFF_MEM;
-            } else {
-                src->slot = static_cast<int32_t>(slot);
-                src->origin = KOVA_ORIGIN_NOISE;
-                src->size = bytes;
-                src->pos = 0;
-                src->rpt_start = 0;
-                src->rpt_end = bytes;
-                kova_gen_white_noise_16bit(src->pcm, bytes);
-                std::memcpy(src->pcm_proc, src->pcm, static_cast<size_t>(bytes));
-            }
-        }
-    }
+    KOVA_SRC* src = new_noise_source(slot, err);
     if (src == nullptr) {
         fputs("kova_gen_sound_source() fail.", stdout);
         return nullptr;

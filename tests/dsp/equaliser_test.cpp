@@ -53,6 +53,7 @@ TEST(Equaliser, InitAndThicknessSetKnownValues) {
 
     kova_eq_init(nullptr, 880, 5000, 48000);
     EXPECT_EQ(kova_eq_set_thickness(nullptr, 0.5), nullptr);
+    EXPECT_EQ(kova_eq_proc(nullptr, 1234), 1234);
 }
 
 TEST(Equaliser, UnityGainsAreAThreeSampleDelay) {
