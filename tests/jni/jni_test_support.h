@@ -10,8 +10,9 @@
 #include <stdlib.h>
 #include <unistd.h>
 
+#include <algorithm>
+#include <atomic>
 #include <cmath>
-#include <cstring>
 #include <filesystem>
 #include <fstream>
 #include <string>
@@ -25,11 +26,14 @@
 namespace fake_jni {
 
 struct Counters {
-    int strings_got = 0;
-    int strings_released = 0;
-    int arrays_got = 0;
-    int arrays_released = 0;
-    int array_length_calls = 0;
+    std::atomic<int> strings_got{0};
+    std::atomic<int> strings_released{0};
+    std::atomic<int> arrays_got{0};
+    std::atomic<int> arrays_released{0};
+    std::atomic<int> array_length_calls{0};
+    void reset() {
+        strings_got = strings_released = arrays_got = arrays_released = array_length_calls = 0;
+    }
 };
 
 inline Counters& counters() {
@@ -67,7 +71,7 @@ T* get_elements(jarray a) {
     counters().arrays_got++;
     auto& items = array_of<T>(a)->items;
     T* copy = new T[items.size() + 1];
-    std::memcpy(copy, items.data(), items.size() * sizeof(T));
+    std::copy(items.begin(), items.end(), copy);
     return copy;
 }
 
@@ -75,7 +79,7 @@ template <typename T>
 void release_elements(jarray a, T* elems, jint mode) {
     counters().arrays_released++;
     auto& items = array_of<T>(a)->items;
-    if (mode == 0 || mode == JNI_COMMIT) std::memcpy(items.data(), elems, items.size() * sizeof(T));
+    if (mode == 0 || mode == JNI_COMMIT) std::copy(elems, elems + items.size(), items.begin());
     if (mode != JNI_COMMIT) delete[] elems;
 }
 

@@ -1,0 +1,248 @@
+/* The control and generation methods through a fake JNI environment: results at the edges, log
+ * lines, the pairing of JNI obtains and releases, and the blocks handed to the output stream. */
+#include "jni/jni_test_support.h"
+#include "kova/kova_output.h"
+#include "kova_host/audio_sink.h"
+
+namespace {
+
+using fake_jni::counters;
+using fake_jni::env;
+using jni_test::init_default;
+using jni_test::jni_lines;
+using Lines = std::vector<std::string>;
+using Bytes = fake_jni::Array<jbyte>;
+using Floats = fake_jni::Array<jfloat>;
+
+jint reg(jlong id, fake_jni::String* s, fake_jni::String* l, fake_jni::String* e) {
+    auto js = [](fake_jni::String* p) { return p ? fake_jni::jstr(*p) : nullptr; };
+    return Java_com_corvane_audio_Kova_reg_1src_1byfiles(env(), nullptr, id, js(s), js(l), js(e));
+}
+jint set_src(jlong id, jint i) {
+    return Java_com_corvane_audio_Kova_set_1src(env(), nullptr, id, i);
+}
+jint gen(jlong id, Bytes& out, float x, float y, jlong t, int action) {
+    return Java_com_corvane_audio_Kova_gen_1sounds(env(), nullptr, id, fake_jni::jbytes(out), x, y,
+                                                   t, 0.5f, action);
+}
+jint gen_ft(jlong id, float x, float y, jlong t, int action) {
+    return Java_com_corvane_audio_Kova_gen_1tofasttrack(env(), nullptr, id, x, y, t, 0.5f, action);
+}
+jint tune(jlong id, jint index, double gain) {
+    return Java_com_corvane_audio_Kova_set_1tuneset(env(), nullptr, id, index, gain, 0.3, 1, 0.5, 0,
+                                                    0.2, 0.0, 0.4, 0.6, 0.9, 0.6);
+}
+jint thick(jlong id, double v) {
+    return Java_com_corvane_audio_Kova_set_1thickness(env(), nullptr, id, v);
+}
+jint vol(jlong id, double v) {
+    return Java_com_corvane_audio_Kova_set_1volume(env(), nullptr, id, v);
+}
+
+class Methods : public ::testing::Test {
+   protected:
+    void SetUp() override {
+        jni_test::reset_to_unloaded();
+        ASSERT_EQ(JNI_OnLoad(fake_jni::vm(), nullptr), JNI_VERSION_1_6);
+        ASSERT_EQ(init_default(), 1);
+        start = {files.write("start.pcm", 9600, 880)};
+        loop = {files.write("loop.pcm", 192000, 220)};
+        end = {files.write("end.pcm", 9600, 440)};
+        counters().reset();
+        cap.clear();
+    }
+    void TearDown() override {
+        kova_host_hold_device(0);
+        jni_test::reset_to_unloaded();
+    }
+
+    jni_test::PcmFiles files;
+    fake_jni::String start, loop, end;
+    kova_test::LogCapture cap;
+};
+
+TEST_F(Methods, InvalidIdsAndEmptySlotsGetTheirResultsAndTouchNothing) {
+    Bytes out(64, 0x5a);
+    for (jlong id : {0L, -5L, 21L, 2L}) {
+        EXPECT_EQ(reg(id, &start, &loop, &end), -3) << id;
+        EXPECT_EQ(set_src(id, 1), -3) << id;
+        EXPECT_EQ(Java_com_corvane_audio_Kova_get_1src_1num(env(), nullptr, id), 0) << id;
+        EXPECT_EQ(gen(id, out, 1, 1, 0, 0), 0) << id;
+        EXPECT_EQ(gen_ft(id, 1, 1, 0, 0), 0) << id;
+        EXPECT_EQ(tune(id, 1, 1.0), -3) << id;
+        EXPECT_EQ(thick(id, 0.5), -3) << id;
+        EXPECT_EQ(vol(id, 0.5), -3) << id;
+        Java_com_corvane_audio_Kova_start_1fasttrack(env(), nullptr, id);
+        Java_com_corvane_audio_Kova_stop_1fasttrack(env(), nullptr, id);
+    }
+    EXPECT_EQ(counters().strings_got, 0);
+    EXPECT_EQ(counters().arrays_got, counters().arrays_released);
+    EXPECT_EQ(out.items, std::vector<jbyte>(64, 0x5a));
+    EXPECT_TRUE(jni_lines(cap).empty());
+    EXPECT_EQ(pKOVAInfo[0].pInstance->pFastTrack->state, 0);  // id 1 untouched
+}
+
+TEST_F(Methods, InstanceWithoutContext) {
+    KovaInstance* inst = pKOVAInfo[0].pInstance;
+    KOVA_CTX* ctx = inst->pCtx;
+    inst->pCtx = nullptr;
+    Bytes out(64);
+    EXPECT_EQ(reg(1, &start, &loop, &end), 0);
+    EXPECT_EQ(counters().strings_got, 3);  // obtained, then all released
+    EXPECT_EQ(counters().strings_released, 3);
+    EXPECT_EQ(set_src(1, 1), -3);
+    EXPECT_EQ(Java_com_corvane_audio_Kova_get_1src_1num(env(), nullptr, 1), 0);
+    EXPECT_EQ(gen(1, out, 1, 1, 0, 0), 0);
+    EXPECT_EQ(gen_ft(1, 1, 1, 0, 0), 0);
+    EXPECT_EQ(tune(1, 1, 1.0), -3);
+    EXPECT_EQ(thick(1, 0.5), -3);
+    EXPECT_EQ(vol(1, 0.5), -3);
+    Java_com_corvane_audio_Kova_start_1fasttrack(env(), nullptr, 1);  // the stream is still there
+    EXPECT_EQ(inst->pFastTrack->state, 1);
+    Java_com_corvane_audio_Kova_stop_1fasttrack(env(), nullptr, 1);
+    EXPECT_EQ(inst->pFastTrack->state, 0);
+    EXPECT_EQ(inst->curSrc, 0);
+    EXPECT_EQ(jni_lines(cap), (Lines{"kova_set_thickness() is failed. (ID is NULL)",
+                                     "kova_set_volume() is failed. (ID is NULL)"}));
+    inst->pCtx = ctx;
+}
+
+TEST_F(Methods, RegistrationAndSelection) {
+    EXPECT_EQ(reg(1, &start, nullptr, &end), 0);
+    EXPECT_EQ(reg(1, nullptr, &loop, nullptr), 1);
+    EXPECT_EQ(reg(1, &start, &loop, &end), 2);
+    EXPECT_EQ(counters().strings_got, 6);
+    EXPECT_EQ(counters().strings_released, 6);
+    EXPECT_EQ(Java_com_corvane_audio_Kova_get_1src_1num(env(), nullptr, 1), 2);
+
+    EXPECT_EQ(set_src(1, 0), -3);  // equals the initial curSrc: no engine call
+    EXPECT_EQ(set_src(1, 1), 0);
+    EXPECT_EQ(pKOVAInfo[0].pInstance->pCtx->active_src, 1);
+    EXPECT_EQ(set_src(1, 1), -3);
+    EXPECT_EQ(set_src(1, 7), -3);  // refused by the engine, yet remembered
+    EXPECT_EQ(pKOVAInfo[0].pInstance->curSrc, 7);
+    EXPECT_EQ(set_src(1, 7), -3);
+    EXPECT_EQ(jni_lines(cap),
+              (Lines{"kova_reg_src () is failed. error=-4", "kova_reg_src (1, idx:1)",
+                     "kova_reg_src (1, idx:2)", "kova_set_actiive_src (1, active1)",
+                     "kova_set_actiive_src (1, active7)"}));
+}
+
+TEST_F(Methods, TuningThicknessAndVolumeReachTheEngine) {
+    ASSERT_EQ(reg(1, &start, &loop, &end), 1);
+    ASSERT_EQ(set_src(1, 1), 0);
+    cap.clear();
+    KOVA_CTX* ctx = pKOVAInfo[0].pInstance->pCtx;
+    EXPECT_EQ(tune(1, 1, 0.75), 0);
+    KOVA_TUNE_SET t{};
+    ASSERT_EQ(kova_get_tuneset(ctx, 1, &t), 0);
+    EXPECT_EQ(t.gain, 0.75);
+    EXPECT_EQ(t.pan, 0.3);
+    EXPECT_EQ(t.osc_enable, 1);
+    EXPECT_EQ(t.osc_depth, 0.5);
+    EXPECT_EQ(t.wn_gain, 0.0);
+    EXPECT_EQ(t.loop_gain, 0.9);
+    EXPECT_EQ(tune(1, 3, 0.5), -3);  // no such set: still logged
+    EXPECT_EQ(thick(1, 1.0), 0);
+    EXPECT_EQ(thick(1, 1.01), -3);
+    EXPECT_EQ(vol(1, 0.5), 0);
+    EXPECT_DOUBLE_EQ(ctx->volume, 0.4);
+    ctx->tag = 0;  // a context the engine refuses
+    EXPECT_EQ(vol(1, 0.5), -3);
+    ctx->tag = KOVA_CTX_TAG;
+    EXPECT_EQ(
+        jni_lines(cap),
+        (Lines{"kova_set_tuneset(1,0.750000,0.300000,(1,0.500000),(0,0.200000),0.000000,"
+               "0.400000,0.600000,0.900000,0.600000)",
+               "kova_set_tuneset(1,0.500000,0.300000,(1,0.500000),(0,0.200000),0.000000,"
+               "0.400000,0.600000,0.900000,0.600000)",
+               "kova_set_thickness(1,1.000000)", "kova_set_thickness(1) is failed. (err : -3)",
+               "kova_set_volume(1,0.500000)", "kova_set_volume(1) is failed. (err : -3)"}));
+}
+
+/* gen_sounds and gen_tofasttrack hand the engine the event as given: a reference context fed the
+ * same events directly produces the same bytes. The ring buffer is read back with the device
+ * held, so it holds exactly what was written. */
+TEST_F(Methods, GeneratedBlocksMatchTheEngineAndReachTheStreamWhole) {
+    ASSERT_EQ(reg(1, &start, &loop, &end), 1);
+    ASSERT_EQ(init_default(), 2);
+    ASSERT_EQ(reg(2, &start, &loop, &end), 1);
+    KOVA_FORMAT f{48000, 2, 1, 1080, 2280};
+    int32_t err = 0;
+    KOVA_CTX* ref = kova_init(&f, &err);
+    ASSERT_NE(ref, nullptr);
+    const char* paths[3] = {start.utf.c_str(), loop.utf.c_str(), end.utf.c_str()};
+    ASSERT_EQ(kova_reg_src_byfiles(ref, paths, &err), 1);
+    std::vector<int16_t> ref_buf(480000);
+    KOVA_PCMBUF ref_pcm{ref_buf.data(), 960000};
+
+    Bytes empty;
+    EXPECT_EQ(gen(1, empty, 10, 10, 0, 0), 0);
+    EXPECT_EQ(counters().arrays_got, counters().arrays_released);
+
+    KOVA_FASTTRACK* ft = pKOVAInfo[1].pInstance->pFastTrack;
+    kova_host_hold_device(1);
+    Bytes out(960000);
+    std::vector<jbyte> played;
+    jlong t = 1000;
+    for (int i = 0; i < 12; ++i) {
+        const int action = i == 0 ? 0 : i == 11 ? 2 : 1;
+        const float x = 100.0f + 9.0f * i, y = 200.0f + 4.0f * i;
+        const KOVA_PARAM p{x, y, t, 0.5f, static_cast<uint32_t>(action)};
+        const int32_t want = kova_gen_sounds(ref, &p, &ref_pcm);
+        ASSERT_EQ(gen(1, out, x, y, t, action), want) << i;
+        ASSERT_TRUE(std::equal(out.items.begin(), out.items.begin() + want,
+                               reinterpret_cast<const jbyte*>(ref_buf.data())))
+            << i;
+        ASSERT_EQ(gen_ft(2, x, y, t, action), want) << i;
+        if (i == 0) {
+            EXPECT_EQ(kova_ringbuffer_read_space(ft->pRing), 0u);  // stopped: nothing stored
+            Java_com_corvane_audio_Kova_start_1fasttrack(env(), nullptr, 2);
+        } else {
+            played.insert(played.end(), out.items.begin(), out.items.begin() + want);
+        }
+        t += 8 + i % 8;
+    }
+    EXPECT_GT(played.size(), 20000u);
+    EXPECT_EQ(counters().arrays_got, counters().arrays_released);
+    std::vector<jbyte> ring(kova_ringbuffer_read_space(ft->pRing));
+    kova_ringbuffer_read(ft->pRing, ring.data(), static_cast<uint32_t>(ring.size()));
+    EXPECT_EQ(ring, played);
+    Java_com_corvane_audio_Kova_stop_1fasttrack(env(), nullptr, 2);
+    EXPECT_EQ(ft->state, 0);
+    kova_deinit(ref);
+}
+
+TEST(JniVolume, TablesAreHandedOutRowByRow) {
+    EXPECT_EQ(Java_com_corvane_audio_Kova_get_1volumeTableSize(env(), nullptr, 1), 17);
+    EXPECT_EQ(Java_com_corvane_audio_Kova_get_1volumeTableSize(env(), nullptr, 2), 17);
+    for (int code : {0, 3, -1}) {
+        EXPECT_EQ(Java_com_corvane_audio_Kova_get_1volumeTableSize(env(), nullptr, code), 1);
+    }
+    const std::vector<jfloat> b{0, 78, 79, 80, 81, 82, 83, 84, 85, 87, 88, 90, 92, 94, 96, 98, 1};
+    const std::vector<jfloat> j{0, 63, 65, 67, 69, 71, 73, 76, 79, 82, 85, 88, 91, 94, 97, 100, 1};
+    Floats spk(17, -1), hs(17, -1);
+    counters().reset();
+    EXPECT_EQ(Java_com_corvane_audio_Kova_get_1volumeTable(env(), nullptr, fake_jni::jfloats(spk),
+                                                           fake_jni::jfloats(hs)),
+              0);
+    EXPECT_EQ(spk.items, b);
+    EXPECT_EQ(hs.items, j);
+    EXPECT_EQ(counters().arrays_got, 2);
+    EXPECT_EQ(counters().arrays_released, 2);
+
+    // Short arrays receive what fits; a null array leaves the other untouched.
+    Floats short_spk(5, -1), long_hs(20, -1);
+    Java_com_corvane_audio_Kova_get_1volumeTable(env(), nullptr, fake_jni::jfloats(short_spk),
+                                                 fake_jni::jfloats(long_hs));
+    EXPECT_EQ(short_spk.items, std::vector<jfloat>(b.begin(), b.begin() + 5));
+    EXPECT_EQ(std::vector<jfloat>(long_hs.items.begin(), long_hs.items.begin() + 17), j);
+    EXPECT_EQ(long_hs.items[17], -1);
+    Floats untouched(17, -1);
+    EXPECT_EQ(Java_com_corvane_audio_Kova_get_1volumeTable(env(), nullptr,
+                                                           fake_jni::jfloats(untouched), nullptr),
+              0);
+    EXPECT_EQ(untouched.items, std::vector<jfloat>(17, -1));
+}
+
+}  // namespace

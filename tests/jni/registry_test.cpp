@@ -1,0 +1,202 @@
+/* The registry functions and the teardown sweeps, including how they treat a busy registry lock. */
+#include <errno.h>
+
+#include <atomic>
+#include <thread>
+
+#include "jni/jni_internal.h"
+#include "jni/jni_test_support.h"
+
+namespace {
+
+using jni_test::deinit;
+using jni_test::init_default;
+using jni_test::jni_lines;
+using Lines = std::vector<std::string>;
+
+const std::string kPid = std::to_string(getpid());
+
+class Registry : public ::testing::Test {
+   protected:
+    void SetUp() override {
+        jni_test::reset_to_unloaded();
+        ASSERT_EQ(JNI_OnLoad(fake_jni::vm(), nullptr), JNI_VERSION_1_6);
+    }
+    void TearDown() override { jni_test::reset_to_unloaded(); }
+
+    /* Takes the engine context away from the instance in `slot` (freeing it). */
+    static void drop_context(int slot) {
+        KovaInstance* inst = pKOVAInfo[slot].pInstance;
+        ASSERT_EQ(kova_deinit(inst->pCtx), 0);
+        inst->pCtx = nullptr;
+    }
+    /* Frees a slot the sweeps cannot free (no context) together with its record. */
+    static void discard(int slot) {
+        KovaInstance* inst = pKOVAInfo[slot].pInstance;
+        _KovaInfoDelbyKova(inst);
+        kova_mem_free(inst);
+    }
+};
+
+TEST(RegistrySlots, IndexAddAndDelbyKova) {
+    jni_test::reset_to_unloaded();
+    kova_test::LogCapture cap;
+    pKOVAInfo[3] = KovaInfo{5, nullptr, 0};  // what static memory would not hold
+    EXPECT_EQ(_KovaInfoGetIndex(), 0);
+    EXPECT_EQ(pKOVAInfoIsInited, 1);
+    EXPECT_EQ(pKOVAInfo[3].pid, -1);
+
+    // Adding to an uninitialised registry initialises it first.
+    pKOVAInfoIsInited = 0;
+    int a = 0, b = 0;
+    EXPECT_EQ(_KovaInfoAdd(10, &a), 0);
+    for (int i = 1; i < 20; ++i) EXPECT_EQ(_KovaInfoAdd(10 + i, i % 2 ? &b : &a), i);
+    EXPECT_EQ(pKOVAInfo[19].pid, 29);
+    EXPECT_EQ(_KovaInfoGetIndex(), -1);
+    EXPECT_EQ(_KovaInfoAdd(99, &a), -1);
+    EXPECT_EQ(pKOVAInfo[0].pid, 10);
+    EXPECT_EQ(jni_lines(cap), (Lines{"KOVA instance MAX", "KOVA instance MAX"}));
+
+    // Only isUsed decides whether a slot is free.
+    pKOVAInfo[7].isUsed = 0;
+    EXPECT_EQ(_KovaInfoGetIndex(), 7);
+    _KovaInfoDelbyKova(&b);  // slots 1, 3, ..., 19; slot 7 is not in use and stays as it is
+    for (int i = 0; i < 20; ++i) {
+        if (i == 7) {
+            EXPECT_EQ(pKOVAInfo[i].pInstance, reinterpret_cast<KovaInstance*>(&b));
+        } else if (i % 2) {
+            EXPECT_EQ(pKOVAInfo[i].pid, -1) << i;
+            EXPECT_EQ(pKOVAInfo[i].pInstance, nullptr) << i;
+        } else {
+            EXPECT_EQ(pKOVAInfo[i].pInstance, reinterpret_cast<KovaInstance*>(&a)) << i;
+        }
+    }
+    _KovaInfoDelbyKova(&a);
+    EXPECT_EQ(_KovaInfoGetIndex(), 0);
+    jni_test::reset_to_unloaded();
+}
+
+TEST_F(Registry, DelAllReportsEverySlotWithTheLastEngineResult) {
+    for (int i = 0; i < 4; ++i) ASSERT_EQ(init_default(), i + 1);
+    drop_context(1);                        // after a success: reports 0
+    pKOVAInfo[2].pInstance->pCtx->tag = 0;  // refused
+    drop_context(3);                        // after the refusal: reports -3
+    kova_test::LogCapture cap;
+    _KovaInfoDelAll();
+    EXPECT_EQ(jni_lines(cap),
+              (Lines{"_KovaInfoDelAll()",
+                     "kova_deinit[0](pid:" + kPid + ") is finished successfully(all)",
+                     "kova_deinit(pid) is failed. error=0(all)",
+                     "kova_deinit[2](pid:" + kPid + ") is already completed(all)",
+                     "kova_deinit(pid) is failed. error=-3(all)"}));
+    EXPECT_EQ(pKOVAInfo[0].isUsed, 0);
+    for (int i = 1; i < 4; ++i) {
+        ASSERT_EQ(pKOVAInfo[i].isUsed, 1);
+        EXPECT_EQ(pKOVAInfo[i].pInstance->pFastTrack, nullptr);
+        EXPECT_EQ(pKOVAInfo[i].pInstance->pcm.data, nullptr);
+    }
+    pKOVAInfo[2].pInstance->pCtx->tag = KOVA_CTX_TAG;
+    discard(1);
+    discard(3);
+}
+
+TEST_F(Registry, DelbyPidSweepsOnlyThatProcess) {
+    for (int i = 0; i < 4; ++i) ASSERT_EQ(init_default(), i + 1);
+    for (int i : {0, 1, 2}) pKOVAInfo[i].pid = 4242;
+    drop_context(0);  // before any engine call: reports -3
+    KOVA_CTX* ok = pKOVAInfo[1].pInstance->pCtx;
+    KOVA_CTX* refused = pKOVAInfo[2].pInstance->pCtx;
+    refused->tag = 0;
+    auto num = [](KOVA_CTX* c) { return std::to_string(reinterpret_cast<intptr_t>(c)); };
+
+    kova_test::LogCapture cap;
+    _KovaInfoDelbyPid(4242);
+    EXPECT_EQ(
+        jni_lines(cap),
+        (Lines{"kova_deinit(pid) is failed. error=-3(sig)",
+               "kova_deinit[1](id:" + num(ok) + "/pid:4242) is finished successfully(sig)",
+               "kova_deinit[2](id:" + num(refused) + "/pid:4242) is already completed(sig)"}));
+    EXPECT_EQ(pKOVAInfo[1].isUsed, 0);
+    EXPECT_EQ(pKOVAInfo[2].isUsed, 1);
+    ASSERT_EQ(pKOVAInfo[3].isUsed, 1);  // another process id: untouched
+    EXPECT_NE(pKOVAInfo[3].pInstance->pFastTrack, nullptr);
+    EXPECT_NE(pKOVAInfo[3].pInstance->pcm.data, nullptr);
+
+    cap.clear();
+    _KovaInfoDelbyPid(1);  // no such process: nothing at all
+    EXPECT_TRUE(jni_lines(cap).empty());
+    refused->tag = KOVA_CTX_TAG;
+    discard(0);
+}
+
+/* The sweeps go on when the registry lock is held elsewhere and never release it for its owner. */
+TEST_F(Registry, SweepsRunWithoutALockTheyCouldNotTake) {
+    pthread_mutex_t* lock = gpKovaMutex;
+
+    // Held by this very thread.
+    ASSERT_EQ(init_default(), 1);
+    pthread_mutex_lock(lock);
+    _KovaInfoDelAll();
+    EXPECT_EQ(pKOVAInfo[0].isUsed, 0);
+    EXPECT_EQ(pthread_mutex_trylock(lock), EBUSY);
+    pthread_mutex_unlock(lock);
+
+    // Held by another thread.
+    ASSERT_EQ(init_default(), 1);
+    pKOVAInfo[0].pid = 4242;
+    std::atomic<int> stage{0};
+    std::thread holder([&] {
+        pthread_mutex_lock(lock);
+        stage = 1;
+        while (stage != 2) std::this_thread::yield();
+        pthread_mutex_unlock(lock);
+    });
+    while (stage != 1) std::this_thread::yield();
+    _KovaInfoDelbyPid(4242);
+    EXPECT_EQ(pKOVAInfo[0].isUsed, 0);
+    EXPECT_EQ(pthread_mutex_trylock(lock), EBUSY);
+    stage = 2;
+    holder.join();
+
+    // Free: taken and given back.
+    EXPECT_EQ(pthread_mutex_trylock(lock), 0);
+    pthread_mutex_unlock(lock);
+    _KovaInfoDelAll();
+    EXPECT_EQ(pthread_mutex_trylock(lock), 0);
+    pthread_mutex_unlock(lock);
+
+    // No lock at all.
+    ASSERT_EQ(init_default(), 1);
+    ASSERT_EQ(init_default(), 2);
+    ASSERT_EQ(deinit(2), 0);
+    ASSERT_EQ(gpKovaMutex, nullptr);
+    _KovaInfoDelAll();
+    EXPECT_EQ(pKOVAInfo[0].isUsed, 0);
+    EXPECT_EQ(gpKovaMutex, nullptr);
+}
+
+/* A Java call queued behind the registry (it holds the gate and waits for the lock) neither blocks
+ * a sweep nor has the lock released under it; it then finds its slot freed. */
+TEST_F(Registry, SweepDoesNotWaitForAQueuedCall) {
+    ASSERT_EQ(init_default(), 1);
+    pthread_mutex_t* lock = gpKovaMutex;
+    pthread_mutex_lock(lock);
+    std::atomic<int> result{1};
+    std::thread caller([&] {
+        result = Java_com_corvane_audio_Kova_set_1volume(fake_jni::env(), nullptr, 1, 0.5);
+    });
+    // Once the gate is taken, the caller is inside the frame and waits for `lock`.
+    for (;;) {
+        if (!kova_jni::registry_gate().try_lock()) break;
+        kova_jni::registry_gate().unlock();
+        std::this_thread::yield();
+    }
+    _KovaInfoDelAll();
+    EXPECT_EQ(pKOVAInfo[0].isUsed, 0);
+    EXPECT_EQ(result, 1);
+    pthread_mutex_unlock(lock);
+    caller.join();
+    EXPECT_EQ(result, -3);
+}
+
+}  // namespace
