@@ -2,6 +2,7 @@
 // formulas, the pitch-raise path, clipping, panning, loop wrap, fast moves and the event rules.
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cmath>
 #include <cstring>
 #include <random>
@@ -213,47 +214,40 @@ TEST_F(GenTest, PanGainsFollowPosition) {
 
 // Overloads are replaced by rotating values, each side on its own, across calls and contexts.
 TEST(GenClipTest, ReplacementValuesRotate) {
-    int last_hi = 0, last_lo = 0, hi_seen = 0, lo_seen = 0;
-    // Every overload seen must be the successor of the previous one on its side.
-    auto check = [&](const std::vector<int16_t>& buf) {
-        for (int16_t v : buf) {
-            if (v > 30000) {
-                ASSERT_TRUE(v == 32517 || v == 32267 || v == 32017) << v;
-                if (last_hi != 0) {
-                    EXPECT_EQ(v, last_hi == 32017 ? 32517 : last_hi - 250);
-                }
-                last_hi = v;
-                ++hi_seen;
-            } else if (v < -30000) {
-                ASSERT_TRUE(v == -32519 || v == -32269 || v == -32019) << v;
-                if (last_lo != 0) {
-                    EXPECT_EQ(v, last_lo == -32019 ? -32519 : last_lo + 250);
-                }
-                last_lo = v;
-                ++lo_seen;
-            } else {
-                EXPECT_LE(std::abs(v), 1);  // only the equaliser's delay of a fresh context
-            }
+    struct Side {
+        std::vector<int> seq;  // the rotation of replacement values
+        int at = -1, seen = 0;
+        void take(int v) {
+            const auto k = static_cast<int>(std::find(seq.begin(), seq.end(), v) - seq.begin());
+            ASSERT_LT(k, 3) << v;
+            EXPECT_TRUE(at < 0 || k == (at + 1) % 3) << v << " after " << seq[at < 0 ? 0 : at];
+            at = k;
+            ++seen;
         }
-    };
+    } hi{{32517, 32267, 32017}}, lo{{-32519, -32269, -32019}};
     for (int round = 0; round < 2; ++round) {
         kova_test::CtxPtr ctx = kova_test::make_ctx(48000, 2, 0, 0, 0);
-        auto* set = kova_test::add_set(
-            ctx.get(), kova_test::make_src(0, KOVA_ORIGIN_FILE, std::vector<int16_t>(20, 32767)),
-            kova_test::make_src(1, KOVA_ORIGIN_FILE, std::vector<int16_t>(20, 0)),
-            kova_test::make_src(2, KOVA_ORIGIN_FILE, std::vector<int16_t>(20, -32768)));
-        set->tune->file_gain = 1.0;
+        auto src = [](int slot, int16_t v) {
+            return kova_test::make_src(slot, KOVA_ORIGIN_FILE, std::vector<int16_t>(20, v));
+        };
+        kova_test::add_set(ctx.get(), src(0, 32767), src(1, 0), src(2, -32768))->tune->file_gain =
+            1.0;
         kova_set_volume(ctx.get(), 10.0);
         std::vector<int16_t> buf(20);
-        for (int call = 0; call < 2; ++call) {
-            ASSERT_EQ(gen(ctx.get(), event(0, 0, 1, KOVA_ACTION_START), buf), 40);
-            check(buf);
-            ASSERT_EQ(gen(ctx.get(), event(0, 0, 2, KOVA_ACTION_END), buf), 40);
-            check(buf);
+        for (int call = 0; call < 4; ++call) {
+            ASSERT_EQ(gen(ctx.get(), event(0, 0, 1, call % 2 ? KOVA_ACTION_END : 0), buf), 40);
+            for (int16_t v : buf) {
+                if (v > 30000)
+                    hi.take(v);
+                else if (v < -30000)
+                    lo.take(v);
+                else
+                    EXPECT_LE(std::abs(v), 1);  // the equaliser's delay in a fresh context
+            }
         }
     }
-    EXPECT_GT(hi_seen, 60);
-    EXPECT_GT(lo_seen, 60);
+    EXPECT_GT(hi.seen, 60);
+    EXPECT_GT(lo.seen, 60);
 }
 
 // The generator's in-register equaliser step must stay bit-identical to kova_eq_proc, state
@@ -291,18 +285,13 @@ TEST_F(GenTest, RefusalsChangeNothing) {
         EXPECT_EQ(kova_gen_sounds(c, p, o), 0);
         EXPECT_EQ(kova_gen_samples(c, p, o), 0);
     };
-    KOVA_PARAM bad = good;
     refused(nullptr, &good, &out);
     refused(ctx.get(), nullptr, &out);
     refused(ctx.get(), &good, nullptr);
-    for (auto mutate : std::vector<void (*)(KOVA_PARAM&)>{
-             [](KOVA_PARAM& p) { p.x = -1; }, [](KOVA_PARAM& p) { p.y = -0.5f; },
-             [](KOVA_PARAM& p) { p.time = -1; }, [](KOVA_PARAM& p) { p.action = 3; },
-             [](KOVA_PARAM& p) { p.x = NAN; }, [](KOVA_PARAM& p) { p.y = INFINITY; }}) {
-        bad = good;
-        mutate(bad);
-        refused(ctx.get(), &bad, &out);
-    }
+    const KOVA_PARAM bad[] = {event(-1, 140, 1032, 1),  event(170, -0.5f, 1032, 1),
+                              event(170, 140, -1, 1),   event(170, 140, 1032, 3),
+                              event(NAN, 140, 1032, 1), event(170, INFINITY, 1032, 1)};
+    for (const KOVA_PARAM& p : bad) refused(ctx.get(), &p, &out);
     KOVA_PCMBUF empty{small.data(), 0}, nodata{nullptr, 128};
     refused(ctx.get(), &good, &empty);
     refused(ctx.get(), &good, &nodata);

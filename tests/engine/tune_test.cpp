@@ -38,41 +38,16 @@ TEST(TuneTest, SetTakesOnlyValuesInRange) {
     auto* set = kova_test::add_set(ctx.get(), nullptr, kova_test::make_src(1, 1, {1, 2}), nullptr);
     KOVA_TUNE_SET& t = *set->tune;
 
-    KOVA_TUNE_SET in = kova_test::file_tune();
-    in.gain = 1.5;
-    in.pan = 0.3;
-    in.osc_enable = 1;
-    in.osc_depth = 2.0;  // on with a bad depth: neither changes
-    in.sharp_enable = 1;
-    in.sharpness = 0.7;
-    in.start_gain = NAN;
-    in.loop_gain = -0.1;
-    in.end_gain = 0.0;
-    in.wn_gain = 1.0;
-    in.file_gain = 1.0000001;
+    // gain out of range, pan taken; oscillator on with a bad depth: neither changes; sharpness
+    // pair taken; NaN, negative and just-above-1 levels skipped; 0 and 1 taken.
+    KOVA_TUNE_SET in{1.5, 0.3, 1, 2.0, 1, 0.7, 1.0, 1.0000001, NAN, -0.1, 0.0};
     EXPECT_EQ(kova_set_tuneset(ctx.get(), 1, &in), KOVA_OK);
-    EXPECT_EQ(t.gain, 1.0);
-    EXPECT_EQ(t.pan, 0.3);
-    EXPECT_EQ(t.osc_enable, 0);
-    EXPECT_EQ(t.osc_depth, 1.0);
-    EXPECT_EQ(t.sharp_enable, 1);
-    EXPECT_EQ(t.sharpness, 0.7);
-    EXPECT_EQ(t.start_gain, 0.6);
-    EXPECT_EQ(t.loop_gain, 0.9);
-    EXPECT_EQ(t.end_gain, 0.0);
-    EXPECT_EQ(t.wn_gain, 1.0);
-    EXPECT_EQ(t.file_gain, 0.4);
+    EXPECT_EQ(values(t), (std::vector<double>{1.0, 0.3, 0, 1.0, 1, 0.7, 1.0, 0.4, 0.6, 0.9, 0.0}));
 
-    in = t;
-    in.sharp_enable = 0;  // off is taken, the depth stays for later
-    in.sharpness = 2.0;
-    in.osc_enable = 2;  // neither on nor off: the pair stays
-    in.osc_depth = 0.5;
+    // Off is taken with the depth kept for later; an enable of 2 leaves its pair alone.
+    in = KOVA_TUNE_SET{0.5, 0.5, 2, 0.5, 0, 2.0, 0.5, 0.5, 0.5, 0.5, 0.5};
     EXPECT_EQ(kova_set_tuneset(ctx.get(), 1, &in), KOVA_OK);
-    EXPECT_EQ(t.sharp_enable, 0);
-    EXPECT_EQ(t.sharpness, 0.7);
-    EXPECT_EQ(t.osc_enable, 0);
-    EXPECT_EQ(t.osc_depth, 1.0);
+    EXPECT_EQ(values(t), (std::vector<double>{0.5, 0.5, 0, 1.0, 0, 0.7, 0.5, 0.5, 0.5, 0.5, 0.5}));
 
     const std::vector<double> kept = values(t);
     EXPECT_EQ(kova_set_tuneset(ctx.get(), 2, &in), KOVA_ERR_INVALID_PARAM);
