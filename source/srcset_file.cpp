@@ -1,5 +1,18 @@
 // Writing a whole source set to a file and reading it back.
 //
+// A source-set file comes from outside and may be truncated, corrupted or hostile. The reader
+// trusts none of its values:
+//  - a filter count above kMaxStoredFilters refuses the file (-3) before the set is touched; a
+//    negative count means no filters;
+//  - descriptors cut by the end of the file, of a type of 4 or more, or for other than 1 or 2
+//    channels are dropped;
+//  - a tune set cut short keeps zeros where the file ends;
+//  - a source record cut short, or with a stored size of 0 or less, leaves its slot empty;
+//    a payload above the slot's limit (38400/192000/38400 bytes) is cut there and the rest
+//    skipped; a payload cut by the end of the file is kept as far as it was read;
+//  - the stored slot is replaced by the record's position, repeat points are kept within the
+//    payload, the play position is 0 and the reference words are never used.
+//
 // kova_open_source results:
 //   0  the set is filled;
 //  -3  unusable arguments (null set, list, tune set or path; a set that is not empty: a slot
@@ -143,7 +156,7 @@ KOVA_API int kova_open_source(KOVA_SRCSET* set, const char* path) {
         auto* dsc = static_cast<KOVA_FLT_DSC*>(kova_mem_calloc(1, sizeof(KOVA_FLT_DSC)));
         if (dsc == nullptr) return KOVA_ERR_INSUFF_MEM;
         // Only whole, usable descriptors are kept: a record cut by the end of the file would
-        // carry a sample rate of 0, and a type of 4 or more names no filter.
+        // carry zeros for its missing fields.
         if (_read_KOVA_FLT_DSC(h, m, dsc) != kFltDscBytes || !stored_filter_usable(*dsc)) {
             kova_mem_free(dsc);
             continue;
@@ -154,7 +167,11 @@ KOVA_API int kova_open_source(KOVA_SRCSET* set, const char* path) {
         }
     }
 
-    _read_KOVA_TUNE_SET(h, m, set->tune);
+    // The record given in is overwritten whole: the engine hands over an unfilled one, so bytes
+    // a short file does not hold are cleared instead of left as whatever the heap held.
+    KOVA_TUNE_SET stored_tune{};
+    _read_KOVA_TUNE_SET(h, m, &stored_tune);
+    *set->tune = stored_tune;
     // Every source read back counts as a file source, which plays at file_gain: a set saved
     // with noise keeps its level through wn_gain.
     KOVA_TUNE_SET* tune = set->tune;

@@ -127,6 +127,7 @@ inline KOVA_SRCSET* prepared_set() {
     set->filters = list_create();
     set->tune = static_cast<KOVA_TUNE_SET*>(kova_mem_malloc(sizeof(KOVA_TUNE_SET)));
     *set->tune = tune(-7.0, -7.0);
+    set->tune->end_gain = -7.0;
     return set;
 }
 
