@@ -95,7 +95,16 @@ NODE* list_getat(LIST* list, uint32_t index) {
     return node;
 }
 
+// The same function under its second exported name. GCC infers `nothrow` for the target and
+// would have the alias declared with it, which the public C declaration cannot carry.
+#if defined(__GNUC__) && !defined(__clang__)
+#pragma GCC diagnostic push
+#pragma GCC diagnostic ignored "-Wmissing-attributes"
+#endif
 NODE* list_getNode(LIST* list, uint32_t index) __attribute__((alias("list_getat")));
+#if defined(__GNUC__) && !defined(__clang__)
+#pragma GCC diagnostic pop
+#endif
 
 NODE* remove_node(LIST* list, NODE* node) {
     if (!list || !node) return nullptr;
