@@ -107,11 +107,16 @@ struct SampleStep {
         int16_t d = kova_gen::finish_sample(eq, gain * s * c * o * pan);
         if (pos >= loop_end) pos = restart;
         if (kSlew) {
+            // |m - d| >= limit moves d to m -/+ limit: the same as clamping d into
+            // [m - limit, m + limit]. Written as a clamp it compiles to conditional moves; the
+            // branch it replaces went either way at random on noise-like sources.
             const int32_t m = memory;
-            const int32_t diff = m - d;
-            if (diff >= kSlewLimit || diff <= -kSlewLimit) {
-                d = static_cast<int16_t>(m > d ? m - kSlewLimit : m + kSlewLimit);
-            }
+            const int32_t lo = m - kSlewLimit;
+            const int32_t hi = m + kSlewLimit;
+            int32_t v = d;
+            v = v < lo ? lo : v;
+            v = v > hi ? hi : v;
+            d = static_cast<int16_t>(v);
             // |d * decay| <= 32768: the conversion is always defined.
             memory = static_cast<int16_t>(static_cast<int32_t>(d * decay));
         }
