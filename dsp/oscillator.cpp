@@ -53,7 +53,10 @@ void advance(KOVA_OSC* osc) {
         }
         osc->hold = 0;
     }
-    osc->phase = (osc->phase + 1) % osc->period;
+    /* The remainder only matters when the phase reaches the period, or lies beyond it after a
+     * frequency change; below it the division is skipped (phase >= 0, period >= 1). */
+    const int64_t next = osc->phase + 1;
+    osc->phase = next < osc->period ? next : next % osc->period;
 }
 
 }  // namespace
@@ -100,6 +103,32 @@ double kova_osc_get_sample(KOVA_OSC* osc) {
     double v = value_at(osc);
     advance(osc);
     return v;
+}
+
+void _osc_fill(KOVA_OSC* osc, double* out, int64_t count) {
+    if (!valid(osc)) {
+        for (int64_t i = 0; i < count; ++i) out[i] = static_cast<double>(KOVA_ERR_INVALID_PARAM);
+        return;
+    }
+    /* The period is fixed for the whole call, so a value depends on the phase alone: each phase
+     * below kKnown is computed once and reused (both samples of a stereo frame, and every cycle
+     * after the first); phases above it are computed as they come. */
+    constexpr int64_t kKnown = 512;
+    double value[kKnown];
+    bool known[kKnown] = {};
+    for (int64_t i = 0; i < count; ++i) {
+        const int64_t phase = osc->phase;
+        if (phase < kKnown) {
+            if (!known[phase]) {
+                value[phase] = value_at(osc);
+                known[phase] = true;
+            }
+            out[i] = value[phase];
+        } else {
+            out[i] = value_at(osc);
+        }
+        advance(osc);
+    }
 }
 
 int32_t kova_osc_gen_samples(KOVA_OSC* osc, int16_t* buf, int32_t bytes) {

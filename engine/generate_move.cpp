@@ -177,7 +177,7 @@ void render_block(KOVA_CTX* ctx, bool osc_on, LoopRun& run, double c, int16_t* d
         double o[kOscChunk];
         for (int64_t done = 0; done < count; done += kOscChunk) {
             const int64_t len = (count - done < kOscChunk) ? count - done : kOscChunk;
-            for (int64_t k = 0; k < len; ++k) o[k] = kova_osc_get_sample(ctx->osc);
+            _osc_fill(ctx->osc, o, len);
             render_span<true>(eq, one, run, st, o, dst + done, len);
         }
     }

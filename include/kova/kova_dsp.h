@@ -12,6 +12,9 @@ KOVA_API int32_t kova_osc_deinit(KOVA_OSC* osc);
 KOVA_API int32_t kova_osc_set_freq(KOVA_OSC* osc, double freq);
 KOVA_API double kova_osc_get_sample(KOVA_OSC* osc);
 KOVA_API int32_t kova_osc_gen_samples(KOVA_OSC* osc, int16_t* buf, int32_t bytes);
+/* Internal: the next `count` values of kova_osc_get_sample, leaving the oscillator as that many
+ * calls would. */
+void _osc_fill(KOVA_OSC* osc, double* out, int64_t count);
 
 /* Thickness equaliser. */
 KOVA_API void kova_eq_init(KOVA_EQ* eq, int32_t low_hz, int32_t high_hz, int32_t sample_rate);
