@@ -1,0 +1,15 @@
+// Each benchmark file registers its benchmarks and its summary section through one of these.
+#ifndef KOVA_BENCH_REGISTRY_H
+#define KOVA_BENCH_REGISTRY_H
+
+namespace kova_bench {
+
+void register_resample_benchmarks();
+void register_ringbuffer_benchmarks();
+void register_generate_benchmarks();
+// Not timed: heap figures per instance, written into the preamble.
+void report_memory();
+
+}  // namespace kova_bench
+
+#endif
