@@ -72,7 +72,8 @@ public final class KovaBench {
                 b = System.nanoTime();
                 if (t != null) {
                     t.moves[t.m++] = b - a;
-                    if (n != 3072) t.failures++;
+                    // 16 ms is 3072 bytes; a pitch-raised block comes out within a frame or two.
+                    if (n < 3056 || n > 3072) t.failures++;
                 }
             }
             a = System.nanoTime();
