@@ -5,6 +5,7 @@
 #include <unistd.h>
 
 #include <charconv>
+#include <cmath>
 
 namespace kova_tool {
 namespace {
@@ -85,6 +86,9 @@ std::string quoted(std::string_view text) {
 }
 
 std::string num(double value) {
+    if (value == std::floor(value) && std::fabs(value) < 1e15) {
+        return std::to_string(static_cast<long long>(value));
+    }
     char buf[64];
     auto res = std::to_chars(buf, buf + sizeof buf, value);
     return std::string(buf, res.ptr);

@@ -1,0 +1,139 @@
+#include "support/tool_run.h"
+
+#include <dirent.h>
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <sndfile.h>
+#include <spawn.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cmath>
+#include <cstdlib>
+#include <fstream>
+#include <sstream>
+
+extern char** environ;
+
+namespace kova_test {
+
+RunResult run_kova(const std::vector<std::string>& args, const std::string& dir) {
+    const std::string out_path = dir + "/.stdout";
+    const std::string err_path = dir + "/.stderr";
+    std::vector<std::string> argv_store{KOVA_TOOL_BINARY};
+    argv_store.insert(argv_store.end(), args.begin(), args.end());
+    std::vector<char*> argv;
+    for (std::string& a : argv_store) argv.push_back(a.data());
+    argv.push_back(nullptr);
+
+    posix_spawn_file_actions_t fa;
+    posix_spawn_file_actions_init(&fa);
+    posix_spawn_file_actions_addopen(&fa, 0, "/dev/null", O_RDONLY, 0);
+    posix_spawn_file_actions_addopen(&fa, 1, out_path.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
+    posix_spawn_file_actions_addopen(&fa, 2, err_path.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
+    posix_spawn_file_actions_addchdir_np(&fa, dir.c_str());
+    pid_t pid = -1;
+    RunResult r;
+    const int rc = posix_spawn(&pid, argv[0], &fa, nullptr, argv.data(), environ);
+    posix_spawn_file_actions_destroy(&fa);
+    if (rc != 0) {
+        ADD_FAILURE() << "cannot start " << argv[0];
+        return r;
+    }
+    int status = 0;
+    waitpid(pid, &status, 0);
+    if (WIFEXITED(status)) r.code = WEXITSTATUS(status);
+    r.out = read_file(out_path);
+    r.err = read_file(err_path);
+    unlink(out_path.c_str());
+    unlink(err_path.c_str());
+    return r;
+}
+
+TempDir::TempDir() {
+    const char* base = std::getenv("TMPDIR");
+    std::string tmpl = std::string(base && *base ? base : "/tmp") + "/kova-tool-test-XXXXXX";
+    std::vector<char> buf(tmpl.begin(), tmpl.end());
+    buf.push_back('\0');
+    if (mkdtemp(buf.data())) path_ = buf.data();
+    EXPECT_FALSE(path_.empty());
+}
+
+TempDir::~TempDir() {
+    for (const std::string& f : list()) unlink(file(f).c_str());
+    rmdir(path_.c_str());
+}
+
+std::vector<std::string> TempDir::list() const {
+    std::vector<std::string> names;
+    DIR* d = opendir(path_.c_str());
+    if (!d) return names;
+    while (dirent* e = readdir(d)) {
+        const std::string n = e->d_name;
+        if (n != "." && n != "..") names.push_back(n);
+    }
+    closedir(d);
+    return names;
+}
+
+std::string read_file(const std::string& path) {
+    std::ifstream in(path, std::ios::binary);
+    std::stringstream ss;
+    ss << in.rdbuf();
+    return ss.str();
+}
+
+void write_file(const std::string& path, const std::string& bytes) {
+    std::ofstream f(path, std::ios::binary | std::ios::trunc);
+    f << bytes;
+}
+
+int64_t file_size(const std::string& path) {
+    struct stat st {};
+    return stat(path.c_str(), &st) == 0 ? st.st_size : -1;
+}
+
+int count_lines(const std::string& text) {
+    int n = 0;
+    std::istringstream in(text);
+    for (std::string line; std::getline(in, line);) {
+        if (!line.empty()) ++n;
+    }
+    return n;
+}
+
+Wav read_wav(const std::string& path) {
+    Wav w;
+    SF_INFO info{};
+    SNDFILE* f = sf_open(path.c_str(), SFM_READ, &info);
+    if (!f) {
+        ADD_FAILURE() << "libsndfile cannot read " << path << ": " << sf_strerror(nullptr);
+        return w;
+    }
+    w.rate = info.samplerate;
+    w.channels = info.channels;
+    w.samples.resize(static_cast<size_t>(info.frames) * info.channels);
+    EXPECT_EQ(sf_readf_short(f, w.samples.data(), info.frames), info.frames);
+    sf_close(f);
+    return w;
+}
+
+double rms(const Wav& w, size_t first, size_t last) {
+    last = std::min(last, w.frames());
+    if (first >= last) return 0.0;
+    double sum = 0;
+    for (size_t i = first * w.channels; i < last * w.channels; ++i)
+        sum += double(w.samples[i]) * w.samples[i];
+    return std::sqrt(sum / double((last - first) * w.channels));
+}
+
+int peak(const Wav& w, size_t first, size_t last) {
+    last = std::min(last, w.frames());
+    int p = 0;
+    for (size_t i = first * w.channels; i < last * w.channels; ++i)
+        p = std::max(p, std::abs(int(w.samples[i])));
+    return p;
+}
+
+}  // namespace kova_test

@@ -1,0 +1,57 @@
+/* Running the kova binary from tests, and the files around it. */
+#ifndef KOVA_TOOL_TESTS_TOOL_RUN_H
+#define KOVA_TOOL_TESTS_TOOL_RUN_H
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+namespace kova_test {
+
+struct RunResult {
+    int code = -1; /* exit code; -1 when the process did not exit normally */
+    std::string out;
+    std::string err;
+};
+
+/* Runs the kova binary with `args` in `dir`, standard input closed. */
+RunResult run_kova(const std::vector<std::string>& args, const std::string& dir);
+
+/* A fresh folder under the system temporary folder, removed with its files. */
+class TempDir {
+   public:
+    TempDir();
+    ~TempDir();
+    TempDir(const TempDir&) = delete;
+    TempDir& operator=(const TempDir&) = delete;
+    const std::string& path() const { return path_; }
+    std::string file(const std::string& name) const { return path_ + "/" + name; }
+    std::vector<std::string> list() const;
+
+   private:
+    std::string path_;
+};
+
+std::string read_file(const std::string& path);
+void write_file(const std::string& path, const std::string& bytes);
+int64_t file_size(const std::string& path);
+/* Lines of `text` that are not empty. */
+int count_lines(const std::string& text);
+
+struct Wav {
+    int rate = 0;
+    int channels = 0;
+    std::vector<int16_t> samples; /* interleaved */
+    size_t frames() const { return channels ? samples.size() / channels : 0; }
+};
+
+/* Reads a WAV file with libsndfile; a file it cannot open fails the calling test. */
+Wav read_wav(const std::string& path);
+/* Root mean square of channel 0..channels-1 together, over frames [first, last). */
+double rms(const Wav& w, size_t first, size_t last);
+/* Largest absolute sample over frames [first, last). */
+int peak(const Wav& w, size_t first, size_t last);
+
+}  // namespace kova_test
+
+#endif
