@@ -52,6 +52,7 @@ JNIEXPORT jlong JNICALL Java_com_corvane_audio_Kova_init(JNIEnv* /*env*/, jclass
 
     if (_KovaInfoGetIndex() < 0) return 0;
 
+    // No memory for the record is answered like no memory for its buffer: 0, nothing kept.
     auto* inst = static_cast<KovaInstance*>(kova_mem_calloc(1, sizeof(KovaInstance)));
     if (!inst) return 0;
     inst->pcm.data = static_cast<int16_t*>(kova_mem_malloc(KOVA_INSTANCE_PCM_BYTES));
@@ -80,6 +81,7 @@ JNIEXPORT jlong JNICALL Java_com_corvane_audio_Kova_init(JNIEnv* /*env*/, jclass
         return -1;
     }
 
+    // Holding the gate, the slot found above is still free; the refusal path is defensive only.
     const int index = _KovaInfoAdd(getpid(), inst);
     if (index < 0) {
         KOVA_JNI_LOG("kova_init(index:%d) is failed. error=%d", 0, err);
