@@ -105,6 +105,11 @@ void TrackThread::run() {
         mSink->start();
         timespec deadline{};
         clock_gettime(CLOCK_MONOTONIC, &deadline);
+        // Like a device that plays out its first period before it asks for more, the first pull
+        // comes one period after start(): the caller has then finished starting its stream and
+        // the first burst is real data, not a request it still refuses.
+        advance(deadline, kPeriodNs);
+        sleep_until(deadline);
         lock.lock();
         // The callback runs without mLock held: it takes the stream's own lock, under which the
         // stream calls stop().
