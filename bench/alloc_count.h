@@ -16,7 +16,8 @@ bool alloc_counting_enabled();
 // malloc, calloc, realloc, aligned allocations made by this thread since start-up.
 uint64_t thread_alloc_count();
 
-// Bytes in use on the heap now: small blocks plus mmap-backed large ones (mallinfo2).
+// Bytes in use on the heap now: the usable sizes of all live blocks as the interposer counted
+// them, or the allocator's statistics (mallinfo2) when the interposer is left out.
 std::size_t heap_bytes_in_use();
 
 }  // namespace kova_bench
