@@ -73,7 +73,6 @@ bool parse_filter_type(const std::string& text, uint32_t& type) {
 
 /* Completes one --filter once the rate is known: frequencies must lie below the Nyquist rate. */
 void finish_filter(FilterSpec& f, const FormatOptions& fmt) {
-    const std::string opt = "--filter " + f.text + ":";
     std::vector<std::string> parts;
     size_t from = 0;
     for (;;) {
@@ -159,16 +158,18 @@ bool parse_on_off(std::string_view option, const std::string& text) {
 }
 
 std::pair<uint32_t, uint32_t> parse_size(std::string_view option, const std::string& text,
-                                         uint32_t lo, uint32_t hi) {
+                                         uint32_t w_lo, uint32_t w_hi, uint32_t h_lo,
+                                         uint32_t h_hi) {
     const size_t x = text.find('x');
     if (x == std::string::npos) {
         usage_error(std::string(option) + " " + quoted(text) +
                     " is not WIDTHxHEIGHT (for example 1080x2280)");
     }
     const std::string o(option);
-    const auto w = static_cast<uint32_t>(parse_int(o + " width", text.substr(0, x), lo, hi, "px"));
+    const auto w =
+        static_cast<uint32_t>(parse_int(o + " width", text.substr(0, x), w_lo, w_hi, "px"));
     const auto h =
-        static_cast<uint32_t>(parse_int(o + " height", text.substr(x + 1), lo, hi, "px"));
+        static_cast<uint32_t>(parse_int(o + " height", text.substr(x + 1), h_lo, h_hi, "px"));
     return {w, h};
 }
 
@@ -182,7 +183,8 @@ bool parse_setup_option(std::string_view name, Args& args, SetupOptions& s) {
     } else if (name == "--panning") {
         f.panning = parse_on_off(name, args.value(name));
     } else if (name == "--screen") {
-        std::tie(f.width, f.height) = parse_size(name, args.value(name), 1, kMaxScreen);
+        std::tie(f.width, f.height) =
+            parse_size(name, args.value(name), 1, kMaxScreen, 1, kMaxScreen);
     } else if (name == "--set") {
         s.source.set_path = args.value(name);
     } else if (name == "--start" || name == "--loop" || name == "--end") {

@@ -90,9 +90,10 @@ double parse_double(std::string_view option, const std::string& text, double lo,
 int64_t parse_int(std::string_view option, const std::string& text, int64_t lo, int64_t hi,
                   std::string_view unit = "");
 bool parse_on_off(std::string_view option, const std::string& text);
-/* "WxH" with each side in lo..hi. */
+/* "WxH" with the width in w_lo..w_hi and the height in h_lo..h_hi. */
 std::pair<uint32_t, uint32_t> parse_size(std::string_view option, const std::string& text,
-                                         uint32_t lo, uint32_t hi);
+                                         uint32_t w_lo, uint32_t w_hi, uint32_t h_lo,
+                                         uint32_t h_hi);
 
 /* Each takes the option just read from `args`; returns false when the name is not its own. */
 bool parse_setup_option(std::string_view name, Args& args, SetupOptions& setup);

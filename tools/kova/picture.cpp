@@ -95,7 +95,18 @@ std::string tick_label(double v, double step) {
     return buf;
 }
 
-void draw_segments(cairo_t* cr, const Layout& l, const std::vector<Segment>& segs, double frames) {
+void draw_segments(cairo_t* cr, const Layout& l, const std::vector<Segment>& blocks,
+                   double frames) {
+    // Blocks of one action that follow each other without a gap form one band.
+    std::vector<Segment> segs;
+    for (const Segment& b : blocks) {
+        if (!segs.empty() && segs.back().action == b.action &&
+            segs.back().first + segs.back().frames == b.first) {
+            segs.back().frames += b.frames;
+        } else {
+            segs.push_back(b);
+        }
+    }
     for (const Segment& s : segs) {
         const Rgb c = s.action == KOVA_ACTION_START ? kStartColour
                       : s.action == KOVA_ACTION_END ? kEndColour

@@ -3,6 +3,7 @@
 #include <cmath>
 #include <memory>
 #include <optional>
+#include <tuple>
 
 #include "commands.h"
 #include "gesture.h"
@@ -43,6 +44,9 @@ void check_on_screen(const std::vector<TouchEvent>& events, const KOVA_FORMAT& f
     }
 }
 
+/* A rendered file is held in memory whole; ten minutes of 48 kHz stereo is about 115 MB. */
+constexpr int kMaxRenderSeconds = 600;
+
 double peak_dbfs(const std::vector<int16_t>& pcm) {
     int peak = 0;
     for (int16_t s : pcm) peak = std::max(peak, std::abs(static_cast<int>(s)));
@@ -70,15 +74,9 @@ int run_render(Args& args) {
         } else if (name == "--png") {
             png = args.value(name);
         } else if (name == "--png-size") {
-            const auto [w, h] =
-                parse_size(name, args.value(name), kPictureMinWidth, kPictureMaxWidth);
-            if (h < kPictureMinHeight || h > kPictureMaxHeight) {
-                usage_error("--png-size height " + std::to_string(h) +
-                            " is out of range (accepted: " + std::to_string(kPictureMinHeight) +
-                            ".." + std::to_string(kPictureMaxHeight) + " px)");
-            }
-            picture.width = w;
-            picture.height = h;
+            std::tie(picture.width, picture.height) =
+                parse_size(name, args.value(name), kPictureMinWidth, kPictureMaxWidth,
+                           kPictureMinHeight, kPictureMaxHeight);
         } else {
             usage_error("unknown option " + quoted(name) + " (see kova render --help)");
         }
@@ -102,6 +100,7 @@ int run_render(Args& args) {
     Timeline timeline(fmt.sample_rate, fmt.channels);
     std::vector<int16_t> block(kBlockBytes / 2);
     size_t moves = 0, silent_moves = 0;
+    const size_t max_frames = static_cast<size_t>(kMaxRenderSeconds) * fmt.sample_rate;
     for (const TouchEvent& e : events) {
         KOVA_PARAM p{};
         p.x = e.x;
@@ -117,6 +116,11 @@ int run_render(Args& args) {
         }
         timeline.place(e.time_ms, e.action, block.data(),
                        bytes > 0 ? static_cast<size_t>(bytes) / 2 : 0);
+        if (timeline.frames() > max_frames) {
+            failure("the sound would last longer than " + std::to_string(kMaxRenderSeconds) +
+                    " s (at the event at " + std::to_string(e.time_ms) +
+                    " ms); render shorter gestures");
+        }
     }
 
     write_wav(wav_file, timeline.pcm(), fmt.sample_rate, fmt.channels);

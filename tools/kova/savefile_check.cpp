@@ -26,7 +26,7 @@ bool read_at(std::ifstream& in, std::streamoff pos, T& value) {
 
 }  // namespace
 
-void check_source_set_file(const std::string& path, bool need_loop) {
+SavedFormat check_source_set_file(const std::string& path, bool need_loop) {
     std::ifstream in(path, std::ios::binary);
     if (!in) failure("cannot read source-set file " + quoted(path) + ": " + std::strerror(errno));
     in.seekg(0, std::ios::end);
@@ -59,6 +59,7 @@ void check_source_set_file(const std::string& path, bool need_loop) {
     if (need_loop && info.has_src[KOVA_SLOT_LOOP] != 1) {
         failure(quoted(path) + " has no loop sound, so it cannot play a stroke");
     }
+    return {info.samplerate, info.channels};
 }
 
 }  // namespace kova_tool

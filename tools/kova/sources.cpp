@@ -244,8 +244,19 @@ PreparedSet prepare_set(Engine& engine, const SetupOptions& setup) {
         src.slot[KOVA_SLOT_START] = std::string(kBuiltinSound);
         src.slot[KOVA_SLOT_END] = std::string(kBuiltinSound);
     }
-    if (!src.set_path.empty())
-        check_source_set_file(src.set_path, src.slot[KOVA_SLOT_LOOP].empty());
+    if (!src.set_path.empty()) {
+        const SavedFormat saved =
+            check_source_set_file(src.set_path, src.slot[KOVA_SLOT_LOOP].empty());
+        // The file's samples play as they are: at another format they play at another pitch.
+        if (saved.rate != static_cast<int32_t>(fmt.sample_rate) ||
+            saved.channels != static_cast<int32_t>(fmt.channels)) {
+            std::fprintf(stderr,
+                         "kova: note: %s was saved for %d Hz, %d channel(s); it plays at %u Hz, "
+                         "%u channel(s)\n",
+                         src.set_path.c_str(), saved.rate, saved.channels, fmt.sample_rate,
+                         fmt.channels);
+        }
+    }
 
     std::unique_ptr<TempDir> temp_owner;
     TempDir* temp = nullptr;
