@@ -42,5 +42,16 @@ TEST(KovaPlay, WithoutDeviceOrCaptureFailsClearly) {
     EXPECT_NE(r.err.find("--capture"), std::string::npos) << r.err;
 }
 
+/* ALSA's "null" device takes samples and discards them; it exists wherever ALSA's configuration
+ * is installed, so the ALSA sink's way (open, configure, write, drain) runs without a card. */
+TEST(KovaPlay, PlaysThroughTheAlsaSinkOnTheNullDevice) {
+    TempDir dir;
+    const RunResult r = run_kova({"play", "--gesture", "fast", "--device", "null"}, dir.path());
+    ASSERT_EQ(r.code, 0) << r.err;
+    EXPECT_NE(r.out.find("playing on ALSA device null"), std::string::npos) << r.out;
+    EXPECT_NE(r.out.find("38 blocks"), std::string::npos)
+        << "down, 36 moves and up all sounded: " << r.out;
+}
+
 }  // namespace
 }  // namespace kova_test
