@@ -35,7 +35,8 @@ constexpr double kFloorDb = -100.0; /* bottom of the spectrogram's colour scale,
 
 struct Layout {
     double left = 70, right = 20, top = 44, bottom = 36;
-    double plot_w = 0, strip_y = 0, strip_h = 8, wave_y = 0, wave_h = 0, spec_y = 0, spec_h = 0;
+    double plot_w = 0, strip_y = 0, strip_h = 8, wave_y = 0, wave_h = 0, spectro_y = 0,
+           spectro_h = 0;
 };
 
 Layout layout(uint32_t w, uint32_t h) {
@@ -46,8 +47,8 @@ Layout layout(uint32_t w, uint32_t h) {
     l.strip_y = l.top;
     l.wave_y = l.strip_y + l.strip_h + 4;
     l.wave_h = std::floor((avail - l.strip_h - 4 - gap) * 0.4);
-    l.spec_y = l.wave_y + l.wave_h + gap;
-    l.spec_h = std::floor(l.top + avail - l.spec_y);
+    l.spectro_y = l.wave_y + l.wave_h + gap;
+    l.spectro_h = std::floor(l.top + avail - l.spectro_y);
     return l;
 }
 
@@ -156,7 +157,7 @@ void draw_waveform(cairo_t* cr, const Layout& l, const std::vector<int16_t>& pcm
 void draw_spectrogram(cairo_t* cr, const Layout& l, const std::vector<int16_t>& pcm, uint32_t rate,
                       uint32_t channels, size_t frames) {
     const int cols = static_cast<int>(l.plot_w);
-    const int rows = static_cast<int>(l.spec_h);
+    const int rows = static_cast<int>(l.spectro_h);
     if (cols < 1 || rows < 1) return;
     const int nfft = rate >= 32000 ? 1024 : 512;
     const int bins = nfft / 2 + 1;
@@ -167,13 +168,13 @@ void draw_spectrogram(cairo_t* cr, const Layout& l, const std::vector<int16_t>& 
         wsum += window[i];
     }
     auto* in = static_cast<double*>(fftw_malloc(sizeof(double) * nfft));
-    auto* spec = static_cast<fftw_complex*>(fftw_malloc(sizeof(fftw_complex) * bins));
-    if (!in || !spec) {
+    auto* spectrum = static_cast<fftw_complex*>(fftw_malloc(sizeof(fftw_complex) * bins));
+    if (!in || !spectrum) {
         fftw_free(in);
-        fftw_free(spec);
+        fftw_free(spectrum);
         failure("out of memory for the spectrogram");
     }
-    fftw_plan plan = fftw_plan_dft_r2c_1d(nfft, in, spec, FFTW_ESTIMATE);
+    fftw_plan plan = fftw_plan_dft_r2c_1d(nfft, in, spectrum, FFTW_ESTIMATE);
 
     // Bin range of each pixel row (row 0 is the top, the highest frequencies).
     std::vector<std::pair<int, int>> row_bins(rows);
@@ -206,7 +207,7 @@ void draw_spectrogram(cairo_t* cr, const Layout& l, const std::vector<int16_t>& 
         fftw_execute(plan);
         for (int b = 0; b < bins; ++b) {
             // A full-scale sine at a bin's centre reads 0 dB.
-            const double mag = std::hypot(spec[b][0], spec[b][1]) / (wsum / 2.0);
+            const double mag = std::hypot(spectrum[b][0], spectrum[b][1]) / (wsum / 2.0);
             db[b] = 20.0 * std::log10(std::max(mag, 1e-12));
         }
         for (int r = 0; r < rows; ++r) {
@@ -220,22 +221,22 @@ void draw_spectrogram(cairo_t* cr, const Layout& l, const std::vector<int16_t>& 
         }
     }
     cairo_surface_mark_dirty(img);
-    cairo_set_source_surface(cr, img, l.left, l.spec_y);
+    cairo_set_source_surface(cr, img, l.left, l.spectro_y);
     cairo_paint(cr);
     cairo_surface_destroy(img);
     fftw_destroy_plan(plan);
     fftw_free(in);
-    fftw_free(spec);
+    fftw_free(spectrum);
     fftw_cleanup();
 
     const double nyquist_khz = rate / 2000.0;
     const double step = nice_step(nyquist_khz, 6);
     for (double f = 0; f <= nyquist_khz + 1e-9; f += step) {
-        const double y = l.spec_y + l.spec_h * (1.0 - f / nyquist_khz);
+        const double y = l.spectro_y + l.spectro_h * (1.0 - f / nyquist_khz);
         text(cr, l.left - 8, y + 4, tick_label(f, step), 11, kText, 1.0);
     }
     cairo_save(cr);
-    cairo_translate(cr, 16, l.spec_y + l.spec_h / 2);
+    cairo_translate(cr, 16, l.spectro_y + l.spectro_h / 2);
     cairo_rotate(cr, -std::numbers::pi / 2);
     text(cr, 0, 0, "kHz", 12, kText, 0.5);
     cairo_restore(cr);
@@ -244,7 +245,7 @@ void draw_spectrogram(cairo_t* cr, const Layout& l, const std::vector<int16_t>& 
 void draw_time_axis(cairo_t* cr, const Layout& l, double seconds) {
     const double span = std::max(seconds, 1e-3);
     const double step = nice_step(span, 12);
-    const double bottom = l.spec_y + l.spec_h;
+    const double bottom = l.spectro_y + l.spectro_h;
     cairo_set_line_width(cr, 1.0);
     for (double t = 0; t <= span + 1e-9; t += step) {
         const double x = std::round(l.left + t / span * l.plot_w) + 0.5;
