@@ -35,8 +35,8 @@ int parse_slot(std::string_view option, const std::string& text) {
 }
 
 /* --repeat SLOT=START:END; either number may be left out to keep the stored value. */
-RepeatSpec parse_repeat(std::string_view option, const std::string& text) {
-    RepeatSpec r;
+RepeatArg parse_repeat(std::string_view option, const std::string& text) {
+    RepeatArg r;
     r.text = text;
     const size_t eq = text.find('=');
     const size_t colon = text.find(':', eq == std::string::npos ? 0 : eq);
@@ -72,7 +72,7 @@ bool parse_filter_type(const std::string& text, uint32_t& type) {
 }
 
 /* Completes one --filter once the rate is known: frequencies must lie below the Nyquist rate. */
-void finish_filter(FilterSpec& f, const FormatOptions& fmt) {
+void finish_filter(FilterArg& f, const FormatOptions& fmt) {
     std::vector<std::string> parts;
     size_t from = 0;
     for (;;) {
@@ -194,7 +194,7 @@ bool parse_setup_option(std::string_view name, Args& args, SetupOptions& s) {
         s.source.slot[slot] = args.value(name);
         if (s.source.slot[slot].empty()) usage_error(std::string(name) + " needs a file name");
     } else if (name == "--filter") {
-        s.source.filters.push_back(FilterSpec{args.value(name), {}});
+        s.source.filters.push_back(FilterArg{args.value(name), {}});
     } else if (name == "--repeat") {
         s.source.repeats.push_back(parse_repeat(name, args.value(name)));
     } else if (name == "--gain") {
@@ -258,14 +258,16 @@ void finish_setup(SetupOptions& s) {
     const bool has_loop =
         !src.set_path.empty() || !src.slot[KOVA_SLOT_LOOP].empty() || !src.filters.empty();
     if (!has_loop && (!src.slot[KOVA_SLOT_START].empty() || !src.slot[KOVA_SLOT_END].empty())) {
-        usage_error("--start and --end need a loop: give --loop FILE, --filter SPEC or --set FILE");
+        usage_error(
+            "--start and --end need a loop: give --loop FILE, --filter TYPE:FREQ[:BANDWIDTH] or "
+            "--set FILE");
     }
     std::set<uint32_t> types;
-    for (FilterSpec& spec : src.filters) {
-        finish_filter(spec, f);
-        if (!types.insert(spec.dsc.type).second) {
-            usage_error("--filter " + quoted(spec.text) + ": a set holds one filter per type (" +
-                        filter_type_name(spec.dsc.type) + " given twice)");
+    for (FilterArg& given : src.filters) {
+        finish_filter(given, f);
+        if (!types.insert(given.dsc.type).second) {
+            usage_error("--filter " + quoted(given.text) + ": a set holds one filter per type (" +
+                        filter_type_name(given.dsc.type) + " given twice)");
         }
     }
     if (s.tune.osc == false && s.tune.osc_depth) {

@@ -28,13 +28,13 @@ struct FormatOptions {
 };
 
 /* One --filter TYPE:FREQ[:BANDWIDTH]; the descriptor is completed once the format is known. */
-struct FilterSpec {
+struct FilterArg {
     std::string text;
     KOVA_FLT_DSC dsc{};
 };
 
 /* One --repeat SLOT=START:END in milliseconds; -1 keeps the stored value. */
-struct RepeatSpec {
+struct RepeatArg {
     std::string text;
     int slot = KOVA_SLOT_LOOP;
     int32_t start_ms = -1;
@@ -49,8 +49,8 @@ inline constexpr std::string_view kBuiltinSound = "builtin";
 struct SourceOptions {
     std::string set_path;                            /* --set: a saved source-set file */
     std::array<std::string, KOVA_SLOT_COUNT> slot{}; /* --start/--loop/--end: raw PCM or builtin */
-    std::vector<FilterSpec> filters;
-    std::vector<RepeatSpec> repeats;
+    std::vector<FilterArg> filters;
+    std::vector<RepeatArg> repeats;
 
     bool builtin() const {
         return set_path.empty() && slot[KOVA_SLOT_LOOP].empty() && filters.empty();

@@ -125,13 +125,13 @@ SlotPaths slot_paths(const SourceOptions& src, const KOVA_FORMAT& fmt, TempDir*&
     return p;
 }
 
-void apply_repeats(Engine& engine, int32_t id, const std::vector<RepeatSpec>& repeats) {
+void apply_repeats(Engine& engine, int32_t id, const std::vector<RepeatArg>& repeats) {
     if (repeats.empty()) return;
     KOVA_RPT_INFO now{};
     check(kova_get_rptinfo(engine.ctx(), id, &now), "reading the repeat points");
     KOVA_RPT_INFO want{};
     for (int s = 0; s < KOVA_SLOT_COUNT; ++s) want.rpt_start_ms[s] = want.rpt_end_ms[s] = -1;
-    for (const RepeatSpec& r : repeats) {
+    for (const RepeatArg& r : repeats) {
         const std::string opt = std::string("--repeat ") + slot_name(r.slot);
         const int64_t len = now.len_ms[r.slot];
         if (len <= 0) usage_error(opt + ": the set has no " + slot_name(r.slot) + " sound");
@@ -237,7 +237,7 @@ PreparedSet prepare_set(Engine& engine, const SetupOptions& setup) {
     const KOVA_FORMAT& fmt = engine.format();
     SourceOptions src = setup.source;
     if (src.builtin()) {
-        FilterSpec f;
+        FilterArg f;
         f.text = "builtin";
         f.dsc = builtin_filter(fmt);
         src.filters.push_back(f);
