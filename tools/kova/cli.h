@@ -44,7 +44,6 @@ class Args {
     std::string_view next();
     /* The value of the option just taken by next(). */
     std::string value(std::string_view option);
-    bool has_inline_value() const { return inline_value_ != nullptr; }
 
    private:
     std::vector<std::string> args_;
