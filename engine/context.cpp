@@ -47,7 +47,6 @@ bool build_members(KOVA_CTX* ctx, const KOVA_FORMAT* f) {
     if (ctx->format == nullptr) return false;
     *ctx->format = *f;
     ctx->norm = screen_norm(f->w, f->h);
-    ctx->fast_count = 0;
     if (f->channels == 1) ctx->format->p = 0;  // panning needs two channels
 
     ctx->prev_param = alloc_cleared<KOVA_PARAM>();
@@ -122,10 +121,7 @@ KOVA_API KOVA_CTX* kova_init(const KOVA_FORMAT* f, int32_t* err) {
     if (kova_checkformat(f) >= 1) {
         auto* ctx = alloc_cleared<KOVA_CTX>();
         if (ctx != nullptr && build_members(ctx, f)) {
-            ctx->active_src = 0;
-            ctx->stroke = 0;
-            ctx->slew_odd = 0;
-            ctx->slew_even = 0;
+            // The record starts cleared: no set active, no stroke open, slew memories at rest.
             ctx->volume = kInitialVolume;
             ctx->tag = KOVA_CTX_TAG;
             *err = KOVA_OK;

@@ -5,7 +5,9 @@
 #include <pthread.h>
 #include <stdint.h>
 
+#include "kova/kova_engine.h"
 #include "kova/kova_list.h"
+#include "kova/kova_source.h"
 #include "kova/kova_types.h"
 
 /* A context is usable while it is non-null and carries its tag. */
@@ -46,22 +48,14 @@ class KovaCtxLock {
     pthread_mutex_t* mutex_;
 };
 
-/* Registration helpers (register_files.cpp). */
+/* Registration helpers (srcset_build.cpp). */
 
-/* Fills the tune set a set gets when it is registered from files or from a filter; the two ways
- * differ only in the noise and file levels. */
+/* The tune set a set gets when it is registered from files or from a filter: the defaults with
+ * the way's own noise and file levels. */
 inline void _fill_reg_tune(KOVA_TUNE_SET* t, double wn_gain, double file_gain) {
-    t->gain = 1.0;
-    t->pan = 0.4;
-    t->osc_enable = 0;
-    t->osc_depth = 1.0;
-    t->sharp_enable = 0;
-    t->sharpness = 0.2;
+    _cfg_tune_default(t);
     t->wn_gain = wn_gain;
     t->file_gain = file_gain;
-    t->start_gain = 0.6;
-    t->loop_gain = 0.9;
-    t->end_gain = 0.6;
 }
 
 /* A new, empty set: cleared record, zeroed tune set, empty filter list, thickness 0.6.
@@ -73,8 +67,42 @@ KOVA_SRCSET* _srcset_new(void);
  * caller still owns the set). */
 int32_t _srcset_append(KOVA_CTX* ctx, KOVA_SRCSET* set);
 
+/* What every registration shares, for a context and error cell the caller has checked: a list
+ * already holding `limit` sets is refused with -5; otherwise, under the context mutex, a new set
+ * is built, `fill(set)` loads it (returning false after storing its own code in *err) and the set
+ * is appended as the active one. Returns the new identifier, or 0 with *err set and nothing
+ * left allocated. */
+template <typename Fill>
+int32_t _srcset_register(KOVA_CTX* ctx, int32_t limit, int32_t* err, Fill fill) {
+    if (_srcset_count(ctx) >= limit) {
+        *err = KOVA_ERR_SRC_FULL;
+        return 0;
+    }
+    KovaCtxLock lock(ctx);
+    KOVA_SRCSET* set = _srcset_new();
+    if (set == nullptr) {
+        *err = KOVA_ERR_INSUFF_MEM;
+        return 0;
+    }
+    if (!fill(set)) {
+        kova_free_sourceset(set);
+        return 0;
+    }
+    const int32_t id = _srcset_append(ctx, set);
+    if (id == 0) {
+        *err = KOVA_ERR_INSUFF_MEM;
+        kova_free_sourceset(set);
+        return 0;
+    }
+    *err = KOVA_OK;
+    return id;
+}
+
 /* Whether a filter descriptor can be designed and run without degenerate coefficients
- * (filter_check in filter_update.cpp). */
+ * (filter_update.cpp). */
 bool _flt_dsc_usable(const KOVA_FLT_DSC* dsc);
+
+/* Appends a copy of `dsc` to a filter list; false (list unchanged) when memory ran out. */
+bool _flt_list_push_copy(LIST* filters, const KOVA_FLT_DSC* dsc);
 
 #endif

@@ -3,6 +3,7 @@
 #include <cmath>
 #include <cstdio>
 #include <cstring>
+#include <memory>
 
 #include "engine/engine_internal.h"
 #include "kova/kova_dsp.h"
@@ -14,6 +15,10 @@ namespace {
 
 // Highest descriptor rate taken; well above any PCM rate this library handles.
 constexpr int32_t kMaxFilterRate = 384000;
+
+struct MemFree {
+    void operator()(char* p) const { kova_mem_free(p); }
+};
 
 // Slots in the order the working copies are rebuilt after a filter change.
 constexpr int kRefilterOrder[KOVA_SLOT_COUNT] = {KOVA_SLOT_LOOP, KOVA_SLOT_START, KOVA_SLOT_END};
@@ -27,13 +32,35 @@ void rebuild_working_copy(KOVA_SRC* src, LIST* filters) {
     src->pos = 0;
 }
 
-// Replaces the set's descriptor of the same type and rebuilds every working copy; file sources
-// are read again from disk first. Takes ownership of the 512-byte path buffer. Mutex held.
-int32_t update_filter_locked(KOVA_SRCSET* set, int32_t index, const KOVA_FLT_DSC* dsc, int32_t* err,
-                             char* path_buf) {
+// Replaces (`attach` false) or attaches a descriptor, then rebuilds every working copy from the
+// unfiltered samples; file sources are read again from disk first. Degenerate descriptors are
+// refused like an invalid type, with the context untouched. Attaching and refiltering happen
+// under one hold of the mutex, so no other operation sees the new descriptor before the sources
+// are rebuilt with it. Every allocation comes first (the path buffer, then an attached
+// descriptor's copy), so running out of memory reports -2 and leaves the set as it was.
+int32_t edit_filters(KOVA_CTX* ctx, int32_t index, const KOVA_FLT_DSC* dsc, int32_t* err,
+                     bool attach) {
+    if (err == nullptr) return 0;
+    *err = KOVA_ERR_INVALID_PARAM;
+    if (!_ctx_alive(ctx) || !_srcset_index_ok(ctx, index) || !_flt_dsc_usable(dsc)) return 0;
+
+    KovaCtxLock lock(ctx);
+    KOVA_SRCSET* set = _fetch_srcset(ctx, index);
+    if (set == nullptr) return 0;
+    const std::unique_ptr<char, MemFree> path_buf(
+        static_cast<char*>(kova_mem_malloc(KOVA_PATH_BUF_BYTES)));
+    if (path_buf == nullptr) {
+        *err = KOVA_ERR_INSUFF_MEM;
+        return 0;
+    }
+    // A type the set already has is replaced rather than attached twice.
+    if (attach && set->filters != nullptr && kova_update_filterdsc(set->filters, dsc) < 0 &&
+        !_flt_list_push_copy(set->filters, dsc)) {
+        *err = KOVA_ERR_INSUFF_MEM;
+        return 0;
+    }
     if (kova_update_filterdsc(set->filters, dsc) < 0) {
         puts("kova_update_filterdsc() < 0 ");
-        kova_mem_free(path_buf);
         return 0;
     }
     for (const int slot : kRefilterOrder) {
@@ -41,17 +68,16 @@ int32_t update_filter_locked(KOVA_SRCSET* set, int32_t index, const KOVA_FLT_DSC
         if (src == nullptr) continue;
         if (src->origin == KOVA_ORIGIN_FILE && src->path != nullptr) {
             // The path lives in the source being released: keep a copy for the reload.
-            std::memset(path_buf, 0, KOVA_PATH_BUF_BYTES);
-            std::strncpy(path_buf, src->path, KOVA_PATH_BUF_BYTES - 1);
+            std::memset(path_buf.get(), 0, KOVA_PATH_BUF_BYTES);
+            std::strncpy(path_buf.get(), src->path, KOVA_PATH_BUF_BYTES - 1);
             kova_free_sourceobj(src);
             // A file that cannot be read again leaves its slot empty; the update still succeeds.
-            set->src[slot] = kova_load_sound_source(path_buf, slot, err);
+            set->src[slot] = kova_load_sound_source(path_buf.get(), slot, err);
             src = set->src[slot];
             if (src == nullptr) continue;
         }
         rebuild_working_copy(src, set->filters);
     }
-    kova_mem_free(path_buf);
     *err = KOVA_OK;
     return index;
 }
@@ -75,56 +101,25 @@ bool _flt_dsc_usable(const KOVA_FLT_DSC* dsc) {
     return true;
 }
 
+bool _flt_list_push_copy(LIST* filters, const KOVA_FLT_DSC* dsc) {
+    auto* copy = static_cast<KOVA_FLT_DSC*>(kova_mem_malloc(sizeof(KOVA_FLT_DSC)));
+    if (copy == nullptr) return false;
+    std::memcpy(copy, dsc, sizeof(KOVA_FLT_DSC));
+    if (list_pushback(filters, copy) != nullptr) return true;
+    kova_mem_free(copy);
+    return false;
+}
+
 extern "C" {
 
 KOVA_API int32_t kova_update_filter(KOVA_CTX* ctx, int32_t index, const KOVA_FLT_DSC* dsc,
                                     int32_t* err) {
-    if (err == nullptr) return 0;
-    *err = KOVA_ERR_INVALID_PARAM;
-    // Degenerate descriptors are refused like an invalid type, with the context untouched.
-    if (!_ctx_alive(ctx) || !_srcset_index_ok(ctx, index) || !_flt_dsc_usable(dsc)) return 0;
-
-    KovaCtxLock lock(ctx);
-    KOVA_SRCSET* set = _fetch_srcset(ctx, index);
-    if (set == nullptr) return 0;
-    // The path buffer is taken before anything changes, so running out of memory reports -2 and
-    // leaves the set's filters and sources as they were.
-    auto* path_buf = static_cast<char*>(kova_mem_malloc(KOVA_PATH_BUF_BYTES));
-    if (path_buf == nullptr) {
-        *err = KOVA_ERR_INSUFF_MEM;
-        return 0;
-    }
-    return update_filter_locked(set, index, dsc, err, path_buf);
+    return edit_filters(ctx, index, dsc, err, false);
 }
 
 KOVA_API int32_t kova_attach_filter(KOVA_CTX* ctx, int32_t index, const KOVA_FLT_DSC* dsc,
                                     int32_t* err) {
-    if (err == nullptr) return 0;
-    *err = KOVA_ERR_INVALID_PARAM;
-    if (!_ctx_alive(ctx) || !_srcset_index_ok(ctx, index) || !_flt_dsc_usable(dsc)) return 0;
-
-    // Attaching and refiltering happen under one hold of the mutex, so no other operation sees
-    // the new descriptor before the sources are rebuilt with it; every allocation comes first,
-    // so a failure leaves the set unchanged.
-    KovaCtxLock lock(ctx);
-    KOVA_SRCSET* set = _fetch_srcset(ctx, index);
-    if (set == nullptr) return 0;
-    auto* path_buf = static_cast<char*>(kova_mem_malloc(KOVA_PATH_BUF_BYTES));
-    if (path_buf == nullptr) {
-        *err = KOVA_ERR_INSUFF_MEM;
-        return 0;
-    }
-    if (set->filters != nullptr && kova_update_filterdsc(set->filters, dsc) < 0) {
-        auto* copy = static_cast<KOVA_FLT_DSC*>(kova_mem_malloc(sizeof(KOVA_FLT_DSC)));
-        if (copy != nullptr) std::memcpy(copy, dsc, sizeof(KOVA_FLT_DSC));
-        if (copy == nullptr || list_pushback(set->filters, copy) == nullptr) {
-            kova_mem_free(copy);
-            kova_mem_free(path_buf);
-            *err = KOVA_ERR_INSUFF_MEM;
-            return 0;
-        }
-    }
-    return update_filter_locked(set, index, dsc, err, path_buf);
+    return edit_filters(ctx, index, dsc, err, true);
 }
 
 KOVA_API int32_t kova_get_filters(KOVA_CTX* ctx, int32_t index,

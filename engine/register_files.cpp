@@ -3,35 +3,6 @@
 #include "kova/kova_dsp.h"
 #include "kova/kova_engine.h"
 #include "kova/kova_source.h"
-#include "util/kova_mem.h"
-
-namespace {
-constexpr double kDefaultThickness = 0.6;
-}
-
-KOVA_SRCSET* _srcset_new(void) {
-    auto* set = static_cast<KOVA_SRCSET*>(kova_mem_calloc(1, sizeof(KOVA_SRCSET)));
-    if (set == nullptr) return nullptr;
-    set->tune = static_cast<KOVA_TUNE_SET*>(kova_mem_calloc(1, sizeof(KOVA_TUNE_SET)));
-    if (set->tune == nullptr) {
-        kova_mem_free(set);
-        return nullptr;
-    }
-    set->filters = list_create();
-    if (set->filters == nullptr) {
-        kova_mem_free(set->tune);
-        kova_mem_free(set);
-        return nullptr;
-    }
-    set->thickness = kDefaultThickness;
-    return set;
-}
-
-int32_t _srcset_append(KOVA_CTX* ctx, KOVA_SRCSET* set) {
-    if (list_pushback(ctx->src_list, set) == nullptr) return 0;
-    ctx->active_src = _srcset_count(ctx);
-    return ctx->active_src;
-}
 
 extern "C" {
 
@@ -41,39 +12,21 @@ KOVA_API int32_t kova_reg_src_byfiles(KOVA_CTX* ctx, const char* const paths[KOV
     *err = KOVA_ERR_INVALID_PARAM;
     // A missing path array is an invalid argument, not a set of empty slots.
     if (!_ctx_alive(ctx) || paths == nullptr) return 0;
-    if (_srcset_count(ctx) >= KOVA_MAX_SRCSETS) {
-        *err = KOVA_ERR_SRC_FULL;
-        return 0;
-    }
-
-    KovaCtxLock lock(ctx);
-    KOVA_SRCSET* set = _srcset_new();
-    if (set == nullptr) {
-        *err = KOVA_ERR_INSUFF_MEM;
-        return 0;
-    }
-    _fill_reg_tune(set->tune, 0.0, 0.4);
-
-    // Each slot loads on its own; a failure only leaves that slot empty (the loader sets the code).
-    for (int slot = 0; slot < KOVA_SLOT_COUNT; ++slot) {
-        set->src[slot] = kova_load_sound_source(paths[slot], slot, err);
-    }
-    // Without a loop sound the set cannot play; whatever made the loop load fail, the source is
-    // what is missing.
-    if (set->src[KOVA_SLOT_LOOP] == nullptr) {
-        *err = KOVA_ERR_SOURCE;
-        kova_free_sourceset(set);
-        return 0;
-    }
-
-    const int32_t id = _srcset_append(ctx, set);
-    if (id == 0) {
-        *err = KOVA_ERR_INSUFF_MEM;
-        kova_free_sourceset(set);
-        return 0;
-    }
-    *err = KOVA_OK;
-    return id;
+    return _srcset_register(ctx, KOVA_MAX_SRCSETS, err, [&](KOVA_SRCSET* set) {
+        _fill_reg_tune(set->tune, 0.0, 0.4);
+        // Each slot loads on its own; a failure only leaves that slot empty (the loader sets the
+        // code).
+        for (int slot = 0; slot < KOVA_SLOT_COUNT; ++slot) {
+            set->src[slot] = kova_load_sound_source(paths[slot], slot, err);
+        }
+        // Without a loop sound the set cannot play; whatever made the loop load fail, the source
+        // is what is missing.
+        if (set->src[KOVA_SLOT_LOOP] == nullptr) {
+            *err = KOVA_ERR_SOURCE;
+            return false;
+        }
+        return true;
+    });
 }
 
 KOVA_API int32_t kova_set_active_src(KOVA_CTX* ctx, int32_t index) {
