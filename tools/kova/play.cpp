@@ -1,4 +1,3 @@
-#include <kova/kova_engine.h>
 #include <kova/kova_fasttrack.h>
 #include <kova/kova_output.h>
 #include <kova_host/audio_sink.h>
@@ -12,10 +11,9 @@
 #include <memory>
 #include <optional>
 
-#include "commands.h"
-#include "gesture.h"
 #include "output_file.h"
 #include "sources.h"
+#include "stroke.h"
 
 namespace kova_tool {
 namespace {
@@ -131,31 +129,22 @@ void wait_until(int64_t until, int64_t start, Status& status) {
 }  // namespace
 
 int run_play(Args& args) {
-    SetupOptions setup;
-    GestureOptions gesture;
     std::string device = "default";
     std::optional<std::string> capture;
-    while (!args.done()) {
-        const std::string name(args.next());
-        if (name == "--help" || name == "-h") {
-            std::fprintf(out(), "%s\n%s\n%s", kHelp, kGestureHelp, kSetupHelp);
-            return kExitOk;
-        }
-        if (parse_setup_option(name, args, setup) || parse_gesture_option(name, args, gesture))
-            continue;
+    const auto own = [&](const std::string& name) {
         if (name == "--device") {
             device = args.value(name);
         } else if (name == "--capture") {
             capture = args.value(name);
         } else {
-            usage_error("unknown option " + quoted(name) + " (see kova play --help)");
+            return false;
         }
-    }
-    finish_setup(setup);
-    set_library_chatter(setup.verbose);
-
-    const KOVA_FORMAT fmt = setup.format.format();
-    const std::vector<TouchEvent> events = load_gesture(gesture, fmt.w, fmt.h);
+        return true;
+    };
+    StrokeCommand cmd;
+    if (!read_stroke_command(args, "play", kHelp, own, cmd)) return kExitOk;
+    const KOVA_FORMAT& fmt = cmd.format;
+    const std::vector<TouchEvent>& events = cmd.events;
 
     char why[256] = "";
     const bool has_device = kova_host_alsa_probe(device.c_str(), why, sizeof why) == 0;
@@ -174,8 +163,8 @@ int run_play(Args& args) {
                 "); use --capture FILE to write the stream to a WAV file");
     }
 
-    Engine engine(setup.format);
-    prepare_set(engine, setup);
+    Engine engine(cmd.setup.format);
+    prepare_set(engine, cmd.setup);
 
     if (capture) {
         kova_host_use_capture_sink();
@@ -200,7 +189,7 @@ int run_play(Args& args) {
     std::fflush(out());
     kova_start_fasttrack(ft);
     Status status(ft, fmt);
-    std::vector<int16_t> block(kBlockBytes / 2);
+    EventBlock block;
     size_t blocks = 0, dropped = 0;
     uint64_t bytes_written = 0;
     const int64_t start = now_ms();
@@ -208,15 +197,8 @@ int run_play(Args& args) {
     for (const TouchEvent& e : events) {
         wait_until(start + (e.time_ms - t0), start, status);
         if (g_interrupted.load()) break;
-        KOVA_PARAM p{};
-        p.x = e.x;
-        p.y = e.y;
-        p.time = e.time_ms;
-        p.aux = e.aux;
-        p.action = e.action;
-        KOVA_PCMBUF buf{block.data(), kBlockBytes};
         if (e.action == KOVA_ACTION_START) status.stroke_begins();
-        const int32_t bytes = kova_gen_sounds(engine.ctx(), &p, &buf);
+        const int32_t bytes = block.generate(engine.ctx(), e);
         if (bytes > 0) {
             const uint32_t n =
                 kova_write_fasttrack(ft, block.data(), kBlockBytes, static_cast<uint32_t>(bytes));

@@ -1,15 +1,12 @@
-#include <kova/kova_engine.h>
-
 #include <cmath>
 #include <memory>
 #include <optional>
 #include <tuple>
 
-#include "commands.h"
-#include "gesture.h"
 #include "output_file.h"
 #include "picture.h"
 #include "sources.h"
+#include "stroke.h"
 #include "timeline.h"
 #include "wav.h"
 
@@ -56,19 +53,10 @@ double peak_dbfs(const std::vector<int16_t>& pcm) {
 }  // namespace
 
 int run_render(Args& args) {
-    SetupOptions setup;
-    GestureOptions gesture;
     std::string output = "stroke.wav";
     std::optional<std::string> png;
     PictureOptions picture;
-    while (!args.done()) {
-        const std::string name(args.next());
-        if (name == "--help" || name == "-h") {
-            std::fprintf(out(), "%s\n%s\n%s", kHelp, kGestureHelp, kSetupHelp);
-            return kExitOk;
-        }
-        if (parse_setup_option(name, args, setup) || parse_gesture_option(name, args, gesture))
-            continue;
+    const auto own = [&](const std::string& name) {
         if (name == "-o" || name == "--output") {
             output = args.value(name);
         } else if (name == "--png") {
@@ -78,14 +66,14 @@ int run_render(Args& args) {
                 parse_size(name, args.value(name), kPictureMinWidth, kPictureMaxWidth,
                            kPictureMinHeight, kPictureMaxHeight);
         } else {
-            usage_error("unknown option " + quoted(name) + " (see kova render --help)");
+            return false;
         }
-    }
-    finish_setup(setup);
-    set_library_chatter(setup.verbose);
-
-    const KOVA_FORMAT fmt = setup.format.format();
-    const std::vector<TouchEvent> events = load_gesture(gesture, fmt.w, fmt.h);
+        return true;
+    };
+    StrokeCommand cmd;
+    if (!read_stroke_command(args, "render", kHelp, own, cmd)) return kExitOk;
+    const KOVA_FORMAT& fmt = cmd.format;
+    const std::vector<TouchEvent>& events = cmd.events;
     check_on_screen(events, fmt);
 
     // Both files are created first, so a folder that cannot be written fails before any work,
@@ -94,22 +82,15 @@ int run_render(Args& args) {
     std::unique_ptr<OutputFile> png_file;
     if (png) png_file = std::make_unique<OutputFile>(*png);
 
-    Engine engine(setup.format);
-    prepare_set(engine, setup);
+    Engine engine(cmd.setup.format);
+    prepare_set(engine, cmd.setup);
 
     Timeline timeline(fmt.sample_rate, fmt.channels);
-    std::vector<int16_t> block(kBlockBytes / 2);
+    EventBlock block;
     size_t moves = 0, silent_moves = 0;
     const size_t max_frames = static_cast<size_t>(kMaxRenderSeconds) * fmt.sample_rate;
     for (const TouchEvent& e : events) {
-        KOVA_PARAM p{};
-        p.x = e.x;
-        p.y = e.y;
-        p.time = e.time_ms;
-        p.aux = e.aux;
-        p.action = e.action;
-        KOVA_PCMBUF buf{block.data(), kBlockBytes};
-        const int32_t bytes = kova_gen_sounds(engine.ctx(), &p, &buf);
+        const int32_t bytes = block.generate(engine.ctx(), e);
         if (e.action == KOVA_ACTION_MOVE) {
             ++moves;
             if (bytes <= 0) ++silent_moves;
