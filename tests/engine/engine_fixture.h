@@ -2,9 +2,14 @@
 #ifndef KOVA_TESTS_ENGINE_FIXTURE_H
 #define KOVA_TESTS_ENGINE_FIXTURE_H
 
+#include <stdlib.h>
+
 #include <cstdint>
 #include <cstring>
+#include <filesystem>
+#include <fstream>
 #include <memory>
+#include <string>
 #include <vector>
 
 #include "kova/kova_engine.h"
@@ -65,6 +70,47 @@ inline KOVA_SRCSET* add_set(KOVA_CTX* ctx, KOVA_SRC* start, KOVA_SRC* loop, KOVA
     ctx->active_src = static_cast<int32_t>(ctx->src_list->count);
     return set;
 }
+
+// The registered set with a 1-based identifier the test knows to exist.
+inline KOVA_SRCSET* set_of(KOVA_CTX* ctx, int id) {
+    return static_cast<KOVA_SRCSET*>(
+        list_getat(ctx->src_list, static_cast<uint32_t>(id - 1))->data);
+}
+
+// The eleven tune values in record order, for whole-record comparisons.
+inline std::vector<double> tune_values(const KOVA_TUNE_SET& t) {
+    return {t.gain,      t.pan,     t.osc_enable * 1.0, t.osc_depth,  t.sharp_enable * 1.0,
+            t.sharpness, t.wn_gain, t.file_gain,        t.start_gain, t.loop_gain,
+            t.end_gain};
+}
+
+// Samples that differ from one to the next, within +-1000.
+inline std::vector<int16_t> varied(size_t samples) {
+    std::vector<int16_t> s(samples);
+    for (size_t k = 0; k < samples; ++k) s[k] = static_cast<int16_t>((k * 37) % 2001) - 1000;
+    return s;
+}
+
+// A fresh folder under /tmp, removed with its files.
+struct TempDir {
+    std::string path;
+    TempDir() {
+        char t[] = "/tmp/kova_engXXXXXX";
+        path = mkdtemp(t);
+    }
+    ~TempDir() { std::filesystem::remove_all(path); }
+    TempDir(const TempDir&) = delete;
+    TempDir& operator=(const TempDir&) = delete;
+    std::string file(const std::string& name) const { return path + "/" + name; }
+    // Writes the elements' bytes to `name` and returns its path.
+    template <typename T>
+    std::string write(const std::string& name, const std::vector<T>& v) const {
+        std::ofstream(file(name), std::ios::binary)
+            .write(reinterpret_cast<const char*>(v.data()),
+                   static_cast<std::streamsize>(v.size() * sizeof(T)));
+        return file(name);
+    }
+};
 
 inline KOVA_PARAM event(float x, float y, int64_t time, uint32_t action) {
     return KOVA_PARAM{x, y, time, 0.0f, action};

@@ -1,10 +1,8 @@
 // Editing a registered set's filters and files; refusal of degenerate descriptors.
 #include <gtest/gtest.h>
-#include <stdlib.h>
 
 #include <cmath>
 #include <cstring>
-#include <filesystem>
 #include <fstream>
 #include <string>
 #include <vector>
@@ -18,15 +16,13 @@ namespace {
 constexpr KOVA_FLT_DSC kLow{KOVA_FLT_LOWPASS, 500.0, 0.0, 1, 48000, 2};
 constexpr KOVA_FLT_DSC kBand{KOVA_FLT_BANDPASS, 1000.0, 200.0, 1, 48000, 2};
 
-// A stereo sine of `hz` at 48 kHz, as raw bytes in a file of the temp dir.
-std::string write_sine(const std::string& dir, const std::string& name, double hz, int frames) {
+// A stereo sine of `hz` at 48 kHz.
+std::vector<int16_t> sine(double hz, int frames) {
     std::vector<int16_t> s(frames * 2);
     for (int i = 0; i < frames; ++i) {
         s[2 * i] = s[2 * i + 1] = static_cast<int16_t>(8000 * std::sin(2 * M_PI * hz * i / 48000));
     }
-    std::ofstream(dir + "/" + name, std::ios::binary)
-        .write(reinterpret_cast<const char*>(s.data()), static_cast<long>(s.size() * 2));
-    return dir + "/" + name;
+    return s;
 }
 
 double rms(const int16_t* s, int n) {
@@ -36,18 +32,11 @@ double rms(const int16_t* s, int n) {
 }
 
 struct FilterOps : testing::Test {
-    std::string dir;
+    kova_test::TempDir dir;
     kova_test::CtxPtr owner = kova_test::make_ctx();
     KOVA_CTX* ctx = owner.get();
     int32_t err = 0;
-    void SetUp() override {
-        char t[] = "/tmp/kova_fltXXXXXX";
-        dir = mkdtemp(t);
-    }
-    void TearDown() override { std::filesystem::remove_all(dir); }
-    KOVA_SRCSET* set(int id) {
-        return static_cast<KOVA_SRCSET*>(list_getat(ctx->src_list, id - 1)->data);
-    }
+    KOVA_SRCSET* set(int id) { return kova_test::set_of(ctx, id); }
     const KOVA_FLT_DSC& filter(int id, uint32_t i) {
         return *static_cast<KOVA_FLT_DSC*>(list_getat(set(id)->filters, i)->data);
     }
@@ -99,8 +88,8 @@ TEST_F(FilterOps, UpdateOfAbsentTypeIsRefusedWithALine) {
 }
 
 TEST_F(FilterOps, UpdateRereadsFilesAndRefiltersEverySource) {
-    const std::string s = write_sine(dir, "s.pcm", 300, 2000),
-                      l = write_sine(dir, "l.pcm", 300, 8000);
+    const std::string s = dir.write("s.pcm", sine(300, 2000)),
+                      l = dir.write("l.pcm", sine(300, 8000));
     const char* paths[3] = {s.c_str(), l.c_str(), nullptr};
     ASSERT_EQ(kova_reg_src_byfiles(ctx, paths, &err), 1);
     ASSERT_EQ(kova_attach_filter(ctx, 1, &kLow, &err), 1);
@@ -109,7 +98,7 @@ TEST_F(FilterOps, UpdateRereadsFilesAndRefiltersEverySource) {
     set(1)->src[0]->pos = 7;
     set(1)->src[1]->pos = 11;
 
-    write_sine(dir, "l.pcm", 6000, 8000);  // the loop file changes on disk
+    dir.write("l.pcm", sine(6000, 8000));  // the loop file changes on disk
     KOVA_FLT_DSC low2 = kLow;
     low2.freq = 400.0;
     ASSERT_EQ(kova_update_filter(ctx, 1, &low2, &err), 1);
@@ -125,7 +114,7 @@ TEST_F(FilterOps, UpdateRereadsFilesAndRefiltersEverySource) {
 
 TEST_F(FilterOps, ReplacingFilesKeepsOtherSlotsAndReportsAnEmptyLoop) {
     ASSERT_EQ(kova_reg_src_byfilter(ctx, &kLow, &err), 1);
-    const std::string s = write_sine(dir, "s.pcm", 300, 1000);
+    const std::string s = dir.write("s.pcm", sine(300, 1000));
     const char* add_start[3] = {s.c_str(), nullptr, nullptr};
     EXPECT_EQ(kova_update_src_byfiles(ctx, 1, add_start, &err), 1);
     EXPECT_EQ(err, KOVA_OK);
@@ -135,7 +124,7 @@ TEST_F(FilterOps, ReplacingFilesKeepsOtherSlotsAndReportsAnEmptyLoop) {
     EXPECT_EQ(set(1)->tune->file_gain, 0.4);
     EXPECT_EQ(set(1)->tune->wn_gain, 0.0);
 
-    const std::string missing = dir + "/none.pcm";
+    const std::string missing = dir.file("none.pcm");
     const char* bad_loop[3] = {nullptr, missing.c_str(), nullptr};
     EXPECT_EQ(kova_update_src_byfiles(ctx, 1, bad_loop, &err), 0);
     EXPECT_EQ(err, KOVA_ERR_SOURCE);

@@ -1,5 +1,6 @@
 // Generation: the worked move checked against a reference built from the documented per-sample
-// formulas, the pitch-raise path, clipping, panning, loop wrap, fast moves and the event rules.
+// formulas, the pitch-raise path, clipping, panning, loop wrap, fast moves, the event rules, and
+// that no event allocates.
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -19,13 +20,6 @@ using kova_test::gen;
 
 constexpr double kWorkedEnv = 14.016304347826086;
 constexpr double kWorkedStep = 0.004237078238224637;
-
-// A loop of 96000 samples (192000 bytes) whose values vary from sample to sample.
-std::vector<int16_t> varied_loop() {
-    std::vector<int16_t> s(96000);
-    for (size_t k = 0; k < s.size(); ++k) s[k] = static_cast<int16_t>((k * 37) % 2001) - 1000;
-    return s;
-}
 
 // Reference loop block: envelope climbing on even samples, gain, panning, equaliser (a fresh
 // one, as in a new context), loop wrap and optionally the slew limiter with decay 0.88.
@@ -61,7 +55,7 @@ std::vector<int16_t> reference(const std::vector<int16_t>& loop, Ref r, int64_t 
 
 struct GenTest : testing::Test {
     kova_test::CtxPtr ctx = kova_test::make_ctx(48000, 2, 1, 1080, 2280);
-    std::vector<int16_t> loop = varied_loop();
+    std::vector<int16_t> loop = kova_test::varied(96000);  // 192000 bytes
     KOVA_SRCSET* set = nullptr;
     std::vector<int16_t> buf = std::vector<int16_t>(40000);
 
@@ -318,6 +312,31 @@ TEST_F(GenTest, RefusalsChangeNothing) {
     EXPECT_EQ(loop_src()->pos, pos);
     EXPECT_EQ(small, std::vector<int16_t>(64, 0x5A5A));
     EXPECT_EQ(kova_gen_sounds(ctx.get(), &good, &out), 128);  // still usable
+}
+
+// Generation never allocates: start, move (every path) and end leave the allocation count alone.
+TEST(GenAllocTest, NoAllocationPerEvent) {
+    kova_test::CtxPtr ctx = kova_test::make_ctx(48000, 2, 1, 1080, 2280);
+    std::vector<int16_t> pcm(4000, 1200);
+    auto* set = kova_test::add_set(ctx.get(), kova_test::make_src(0, KOVA_ORIGIN_FILE, pcm),
+                                   kova_test::make_src(1, KOVA_ORIGIN_NOISE, pcm),
+                                   kova_test::make_src(2, KOVA_ORIGIN_FILE, pcm));
+    std::vector<int16_t> buf(20000);
+    // Plain, oscillator, pitch raise, and both (the pitch raise stages into the work buffer).
+    const int32_t modes[4][2] = {{0, 0}, {1, 0}, {0, 1}, {1, 1}};
+    for (const auto& mode : modes) {
+        set->tune->osc_enable = mode[0];
+        set->tune->sharp_enable = mode[1];
+        set->tune->sharpness = 1.0;
+        const unsigned long before = kova_mem_alloc_count();
+        int32_t bytes = kova_test::gen(ctx.get(), event(10, 10, 1000, KOVA_ACTION_START), buf);
+        for (int k = 1; k <= 8; ++k) {
+            bytes += kova_test::gen(ctx.get(), event(10.0f + 160 * k, 10, 1000 + 20 * k, 1), buf);
+        }
+        bytes += kova_test::gen(ctx.get(), event(10, 10, 1300, KOVA_ACTION_END), buf);
+        EXPECT_EQ(kova_mem_alloc_count(), before);
+        EXPECT_GT(bytes, 2 * 8000);  // the calls did produce sound
+    }
 }
 
 }  // namespace

@@ -1,9 +1,6 @@
 // Registration by files, filter and saved file: identifiers, limits, defaults, failure paths.
 #include <gtest/gtest.h>
-#include <stdlib.h>
 
-#include <filesystem>
-#include <fstream>
 #include <string>
 #include <vector>
 
@@ -13,31 +10,19 @@
 
 namespace {
 
-struct TempDir {
-    std::string path;
-    TempDir() {
-        char t[] = "/tmp/kova_regXXXXXX";
-        path = mkdtemp(t);
-    }
-    ~TempDir() { std::filesystem::remove_all(path); }
-    std::string pcm(const std::string& name, size_t samples) const {
-        std::vector<int16_t> s(samples);
-        for (size_t i = 0; i < samples; ++i) s[i] = static_cast<int16_t>(i * 37 % 2000 - 1000);
-        std::ofstream(path + "/" + name, std::ios::binary)
-            .write(reinterpret_cast<const char*>(s.data()), static_cast<long>(samples * 2));
-        return path + "/" + name;
-    }
-};
+using kova_test::set_of;
+using kova_test::tune_values;
 
 const KOVA_FLT_DSC kLowpass{KOVA_FLT_LOWPASS, 2000.0, 0.0, 1, 48000, 2};
 
 }  // namespace
 
 TEST(Registration, LoopPathDecidesWhetherASetExists) {
-    TempDir dir;
+    kova_test::TempDir dir;
     auto e = kova_test::make_ctx();
-    const std::string start = dir.pcm("s.pcm", 400), loop = dir.pcm("l.pcm", 4000),
-                      end = dir.pcm("e.pcm", 400), missing = dir.path + "/none.pcm";
+    const std::string start = dir.write("s.pcm", kova_test::varied(400)),
+                      loop = dir.write("l.pcm", kova_test::varied(4000)),
+                      end = dir.write("e.pcm", kova_test::varied(400)), missing = dir.file("none");
     int32_t err = 0;
     const char* no_loop[3] = {start.c_str(), nullptr, end.c_str()};
     EXPECT_EQ(kova_reg_src_byfiles(e.get(), no_loop, &err), 0);
@@ -51,7 +36,7 @@ TEST(Registration, LoopPathDecidesWhetherASetExists) {
     const char* only_loop[3] = {nullptr, loop.c_str(), nullptr};
     ASSERT_EQ(kova_reg_src_byfiles(e.get(), only_loop, &err), 1);
     EXPECT_EQ(err, KOVA_OK);
-    auto* set = static_cast<KOVA_SRCSET*>(list_getat(e.get()->src_list, 0)->data);
+    const KOVA_SRCSET* set = set_of(e.get(), 1);
     EXPECT_EQ(set->src[KOVA_SLOT_START], nullptr);
     EXPECT_EQ(set->src[KOVA_SLOT_END], nullptr);
     ASSERT_EQ(set->src[KOVA_SLOT_LOOP]->size, 8000);
@@ -61,16 +46,25 @@ TEST(Registration, LoopPathDecidesWhetherASetExists) {
     EXPECT_EQ(kova_test::gen(e.get(), kova_test::event(10, 10, 9, KOVA_ACTION_END), buf), 0);
 }
 
-TEST(Registration, IdentifiersLimitsAndSelection) {
-    TempDir dir;
+TEST(Registration, IdentifiersDefaultsLimitsAndSelection) {
+    kova_test::TempDir dir;
     auto e = kova_test::make_ctx();
-    const std::string loop = dir.pcm("l.pcm", 4000), saved = dir.path + "/set.kova";
+    const std::string loop = dir.write("l.pcm", kova_test::varied(4000)), saved = dir.file("set");
     const char* paths[3] = {nullptr, loop.c_str(), nullptr};
     int32_t err = 0;
     EXPECT_EQ(kova_reg_src_byfiles(e.get(), paths, &err), 1);
     EXPECT_EQ(kova_reg_src_byfilter(e.get(), &kLowpass, &err), 2);
     EXPECT_EQ(e.get()->active_src, 2);
     EXPECT_EQ(kova_get_src_num(e.get()), 2);
+    // The two ways' tune sets differ only in the noise and file levels.
+    KOVA_TUNE_SET t{};
+    ASSERT_EQ(kova_get_tuneset(e.get(), 1, &t), 0);
+    EXPECT_EQ(tune_values(t), tune_values(kova_test::file_tune()));
+    ASSERT_EQ(kova_get_tuneset(e.get(), 2, &t), 0);
+    EXPECT_EQ(tune_values(t),
+              (std::vector<double>{1.0, 0.4, 0, 1.0, 0, 0.2, 0.5, 0.0, 0.6, 0.9, 0.6}));
+    EXPECT_EQ(set_of(e.get(), 1)->thickness, 0.6);
+    EXPECT_EQ(set_of(e.get(), 2)->thickness, 0.6);
     ASSERT_GT(kova_save_source(e.get(), 1, saved.c_str()), 0);
 
     for (int i = 3; i <= 20; ++i) ASSERT_EQ(kova_reg_src_byfilter(e.get(), &kLowpass, &err), i);
@@ -119,40 +113,13 @@ TEST(Registration, RefusedArgumentsChangeNothing) {
     EXPECT_EQ(e.get()->active_src, 0);
 }
 
-TEST(Registration, TuneDefaultsDifferOnlyInNoiseAndFileLevel) {
-    TempDir dir;
-    auto e = kova_test::make_ctx();
-    const std::string loop = dir.pcm("l.pcm", 100);
-    const char* paths[3] = {nullptr, loop.c_str(), nullptr};
-    int32_t err = 0;
-    ASSERT_EQ(kova_reg_src_byfiles(e.get(), paths, &err), 1);
-    ASSERT_EQ(kova_reg_src_byfilter(e.get(), &kLowpass, &err), 2);
-    for (int id = 1; id <= 2; ++id) {
-        KOVA_TUNE_SET t{};
-        ASSERT_EQ(kova_get_tuneset(e.get(), id, &t), 0);
-        EXPECT_EQ(t.gain, 1.0);
-        EXPECT_EQ(t.pan, 0.4);
-        EXPECT_EQ(t.osc_enable, 0);
-        EXPECT_EQ(t.osc_depth, 1.0);
-        EXPECT_EQ(t.sharp_enable, 0);
-        EXPECT_EQ(t.sharpness, 0.2);
-        EXPECT_EQ(t.wn_gain, id == 1 ? 0.0 : 0.5);
-        EXPECT_EQ(t.file_gain, id == 1 ? 0.4 : 0.0);
-        EXPECT_EQ(t.start_gain, 0.6);
-        EXPECT_EQ(t.loop_gain, 0.9);
-        EXPECT_EQ(t.end_gain, 0.6);
-        EXPECT_EQ(static_cast<KOVA_SRCSET*>(list_getat(e.get()->src_list, id - 1)->data)->thickness,
-                  0.6);
-    }
-}
-
 // Every allocation of every registration path is made to fail in turn: the call reports a
 // documented code, leaves the list and the active set alone, and leaks nothing (ASan).
 TEST(Registration, AllocationFailuresLeaveNothingBehind) {
-    TempDir dir;
+    kova_test::TempDir dir;
     auto e = kova_test::make_ctx();
-    const std::string start = dir.pcm("s.pcm", 400), loop = dir.pcm("l.pcm", 4000),
-                      saved = dir.path + "/set.kova";
+    const std::string start = dir.write("s.pcm", kova_test::varied(400)),
+                      loop = dir.write("l.pcm", kova_test::varied(4000)), saved = dir.file("set");
     const char* paths[3] = {start.c_str(), loop.c_str(), nullptr};
     int32_t err = 0;
     ASSERT_EQ(kova_reg_src_byfilter(e.get(), &kLowpass, &err), 1);

@@ -1,22 +1,11 @@
 // Repeat points in milliseconds: conversions with known numbers, reading and storing them.
 #include <gtest/gtest.h>
-#include <stdlib.h>
 
-#include <filesystem>
-#include <fstream>
 #include <string>
 #include <vector>
 
 #include "engine/engine_fixture.h"
 #include "kova/kova.h"
-
-namespace {
-
-KOVA_SRC* slot_src(KOVA_CTX* ctx, int id, int slot) {
-    return static_cast<KOVA_SRCSET*>(list_getat(ctx->src_list, id - 1)->data)->src[slot];
-}
-
-}  // namespace
 
 TEST(RepeatInfo, ConversionsGiveKnownNumbers) {
     EXPECT_EQ(_cvt_ms_to_byte(100, 48000, 2), 19200);
@@ -59,18 +48,16 @@ TEST(RepeatInfo, FilterSetReportsOneSecondLoopAndEmptySlots) {
 }
 
 TEST(RepeatInfo, StoringKeepsValuesWithinTheSource) {
-    char tmpl[] = "/tmp/kova_rptXXXXXX";
-    const std::string dir = mkdtemp(tmpl), loop = dir + "/loop.pcm", start = dir + "/start.pcm";
-    std::vector<char> bytes(17640, 1);  // 100 ms at 44100 Hz stereo
-    std::ofstream(loop, std::ios::binary).write(bytes.data(), 17640);
-    std::ofstream(start, std::ios::binary).write(bytes.data(), 8820);  // 50 ms
+    kova_test::TempDir dir;
+    const std::string loop = dir.write("loop.pcm", std::vector<char>(17640, 1)),  // 100 ms
+        start = dir.write("start.pcm", std::vector<char>(8820, 1));               // 50 ms
     auto owner = kova_test::make_ctx(44100, 2);
     KOVA_CTX* ctx = owner.get();
     const char* paths[3] = {start.c_str(), loop.c_str(), nullptr};
     int32_t err = 0;
     ASSERT_EQ(kova_reg_src_byfiles(ctx, paths, &err), 1);
-    KOVA_SRC* s = slot_src(ctx, 1, KOVA_SLOT_START);
-    KOVA_SRC* l = slot_src(ctx, 1, KOVA_SLOT_LOOP);
+    KOVA_SRC* s = kova_test::set_of(ctx, 1)->src[KOVA_SLOT_START];
+    KOVA_SRC* l = kova_test::set_of(ctx, 1)->src[KOVA_SLOT_LOOP];
 
     KOVA_RPT_INFO in{{0, 0, 0}, {-1, 5, 0}, {51, 10, 7}};
     ASSERT_EQ(kova_set_rptinfo(ctx, 1, &in), 0);
@@ -94,5 +81,4 @@ TEST(RepeatInfo, StoringKeepsValuesWithinTheSource) {
     EXPECT_EQ(kova_set_rptinfo(ctx, 1, nullptr), KOVA_ERR_INVALID_PARAM);
     EXPECT_EQ(kova_set_rptinfo(nullptr, 1, &in), KOVA_ERR_INVALID_PARAM);
     EXPECT_EQ(l->rpt_end, 0);
-    std::filesystem::remove_all(dir);
 }

@@ -1,6 +1,5 @@
 // Saving a set and registering the saved file again, checked against the file's bytes.
 #include <gtest/gtest.h>
-#include <stdlib.h>
 #include <sys/stat.h>
 
 #include <cstring>
@@ -15,18 +14,7 @@
 
 namespace {
 
-struct TempDir {
-    std::string path;
-    TempDir() {
-        char t[] = "/tmp/kova_saveXXXXXX";
-        path = mkdtemp(t);
-    }
-    ~TempDir() { std::filesystem::remove_all(path); }
-    std::string write(const std::string& name, const std::vector<char>& bytes) const {
-        std::ofstream(path + "/" + name, std::ios::binary).write(bytes.data(), bytes.size());
-        return path + "/" + name;
-    }
-};
+using kova_test::set_of;
 
 std::vector<char> read_all(const std::string& p) {
     std::ifstream f(p, std::ios::binary);
@@ -46,26 +34,19 @@ T at(const std::vector<char>& file, size_t off) {
     return v;
 }
 
-KOVA_SRCSET* set_of(KOVA_CTX* ctx, int id) {
-    return static_cast<KOVA_SRCSET*>(list_getat(ctx->src_list, id - 1)->data);
-}
-
 void expect_same_dsc(const KOVA_FLT_DSC& a, const KOVA_FLT_DSC& b) {
-    EXPECT_EQ(a.type, b.type);
-    EXPECT_EQ(a.freq, b.freq);
-    EXPECT_EQ(a.bandwidth, b.bandwidth);
-    EXPECT_EQ(a.enable, b.enable);
-    EXPECT_EQ(a.samplerate, b.samplerate);
-    EXPECT_EQ(a.channels, b.channels);
+    EXPECT_TRUE(a.type == b.type && a.freq == b.freq && a.bandwidth == b.bandwidth &&
+                a.enable == b.enable && a.samplerate == b.samplerate && a.channels == b.channels)
+        << a.type << " " << a.freq << " vs " << b.type << " " << b.freq;
 }
 
 }  // namespace
 
 TEST(SaveSource, SavedSetRegistersAgainWithItsShape) {
-    TempDir dir;
+    kova_test::TempDir dir;
     const std::vector<char> start = wave(2000, 1), loop = wave(40000, 2), end = wave(1200, 3);
     const std::string sp = dir.write("s.pcm", start), lp = dir.write("l.pcm", loop),
-                      ep = dir.write("e.pcm", end), saved = dir.path + "/set.kova";
+                      ep = dir.write("e.pcm", end), saved = dir.file("set.kova");
     auto a_owner = kova_test::make_ctx();
     KOVA_CTX* a = a_owner.get();
     const char* paths[3] = {sp.c_str(), lp.c_str(), ep.c_str()};
@@ -139,7 +120,7 @@ TEST(SaveSource, SavedSetRegistersAgainWithItsShape) {
 }
 
 TEST(SaveSource, OverwritesWithoutTruncatingAndWritesOnlyPresentSlots) {
-    TempDir dir;
+    kova_test::TempDir dir;
     const std::string path = dir.write("old.kova", std::vector<char>(300000, '\xAB'));
     auto ctx_owner = kova_test::make_ctx();
     KOVA_CTX* ctx = ctx_owner.get();
@@ -159,7 +140,7 @@ TEST(SaveSource, OverwritesWithoutTruncatingAndWritesOnlyPresentSlots) {
 }
 
 TEST(SaveSource, PathLimitsAndRefusals) {
-    TempDir dir;
+    kova_test::TempDir dir;
     auto ctx_owner = kova_test::make_ctx();
     KOVA_CTX* ctx = ctx_owner.get();
     const KOVA_FLT_DSC low{KOVA_FLT_LOWPASS, 2000.0, 0.0, 1, 48000, 2};
