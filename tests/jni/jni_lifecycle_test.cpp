@@ -4,30 +4,19 @@
 
 namespace {
 
-using jni_test::deinit;
-using jni_test::init_default;
-using jni_test::jni_lines;
-using Lines = std::vector<std::string>;
+using namespace jni_test;
 
-const std::string kPid = std::to_string(getpid());
-
-class Lifecycle : public ::testing::Test {
+class Lifecycle : public Loaded {
    protected:
     void SetUp() override {
-        jni_test::reset_to_unloaded();
-        fake_jni::g_getenv_result = JNI_OK;
-        ASSERT_EQ(JNI_OnLoad(fake_jni::vm(), nullptr), JNI_VERSION_1_6);
+        Loaded::SetUp();
         cap.clear();
-    }
-    void TearDown() override {
-        kova_mem_fail_after(-1);
-        jni_test::reset_to_unloaded();
     }
     kova_test::LogCapture cap;
 };
 
 TEST(JniLoad, LoadHookCreatesLockAndRegistryOnceAndOnlyWithAnEnvironment) {
-    jni_test::reset_to_unloaded();
+    reset_to_unloaded();
     kova_test::LogCapture cap;
     fake_jni::g_getenv_result = JNI_EDETACHED;
     EXPECT_EQ(JNI_OnLoad(fake_jni::vm(), nullptr), JNI_ERR);
@@ -58,7 +47,7 @@ TEST(JniLoad, LoadHookCreatesLockAndRegistryOnceAndOnlyWithAnEnvironment) {
     EXPECT_EQ(pKOVAInfo[0].pInstance, reinterpret_cast<KovaInstance*>(&marker));
     EXPECT_EQ(jni_lines(cap), Lines{"KOVA_JNI_OnLoad()"});
     _KovaInfoDelbyKova(&marker);
-    jni_test::reset_to_unloaded();
+    reset_to_unloaded();
 }
 
 TEST_F(Lifecycle, InitFillsTheFirstFreeSlotAndDeinitFreesIt) {
@@ -181,16 +170,14 @@ TEST_F(Lifecycle, RefusedTeardownKeepsTheSlotUntilARetrySucceeds) {
 TEST_F(Lifecycle, DeinitOfAnInstanceWithoutContextReportsIt) {
     ASSERT_EQ(init_default(), 1);
     KovaInstance* inst = pKOVAInfo[0].pInstance;
-    ASSERT_EQ(kova_deinit(inst->pCtx), 0);
-    inst->pCtx = nullptr;
+    drop_context(0);
     cap.clear();
     EXPECT_EQ(deinit(1), -3);
     EXPECT_EQ(jni_lines(cap), (Lines{"kova_deinit()", "kova_deinit() is failed. error=-3"}));
     EXPECT_EQ(pKOVAInfo[0].pInstance, inst);
     EXPECT_EQ(inst->pFastTrack, nullptr);
     EXPECT_EQ(gpKovaMutex, nullptr);
-    _KovaInfoDelbyKova(inst);
-    kova_mem_free(inst);
+    discard(0);
 }
 
 TEST_F(Lifecycle, UnloadTearsDownLiveInstancesButKeepsRefusedOnes) {

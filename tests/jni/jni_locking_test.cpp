@@ -13,15 +13,7 @@ namespace {
 using fake_jni::env;
 using jni_test::deinit;
 using jni_test::init_default;
-
-class Locking : public ::testing::Test {
-   protected:
-    void SetUp() override {
-        jni_test::reset_to_unloaded();
-        ASSERT_EQ(JNI_OnLoad(fake_jni::vm(), nullptr), JNI_VERSION_1_6);
-    }
-    void TearDown() override { jni_test::reset_to_unloaded(); }
-};
+using Locking = jni_test::Loaded;
 
 /* A method waits for the registry lock held elsewhere: it cannot reach the registry before the
  * holder lets go. (The pause only gives a wrong implementation time to run ahead.) */

@@ -10,9 +10,8 @@ using fake_jni::counters;
 using fake_jni::env;
 using jni_test::init_default;
 using jni_test::jni_lines;
-using Lines = std::vector<std::string>;
+using jni_test::Lines;
 using Bytes = fake_jni::Array<jbyte>;
-using Floats = fake_jni::Array<jfloat>;
 
 jint reg(jlong id, fake_jni::String* s, fake_jni::String* l, fake_jni::String* e) {
     auto js = [](fake_jni::String* p) { return p ? fake_jni::jstr(*p) : nullptr; };
@@ -39,11 +38,10 @@ jint vol(jlong id, double v) {
     return Java_com_corvane_audio_Kova_set_1volume(env(), nullptr, id, v);
 }
 
-class Methods : public ::testing::Test {
+class Methods : public jni_test::Loaded {
    protected:
     void SetUp() override {
-        jni_test::reset_to_unloaded();
-        ASSERT_EQ(JNI_OnLoad(fake_jni::vm(), nullptr), JNI_VERSION_1_6);
+        Loaded::SetUp();
         ASSERT_EQ(init_default(), 1);
         start = {files.write("start.pcm", 9600, 880)};
         loop = {files.write("loop.pcm", 192000, 220)};
@@ -53,7 +51,7 @@ class Methods : public ::testing::Test {
     }
     void TearDown() override {
         kova_host_hold_device(0);
-        jni_test::reset_to_unloaded();
+        Loaded::TearDown();
     }
 
     jni_test::PcmFiles files;
@@ -211,28 +209,6 @@ TEST_F(Methods, GeneratedBlocksMatchTheEngineAndReachTheStreamWhole) {
     Java_com_corvane_audio_Kova_stop_1fasttrack(env(), nullptr, 2);
     EXPECT_EQ(ft->state, 0);
     kova_deinit(ref);
-}
-
-/* Arrays of any length get at most one row each, never more than they hold. */
-TEST(JniVolume, RowsAreCopiedWithinTheJavaArrays) {
-    const std::vector<jfloat> b{0, 78, 79, 80, 81, 82, 83, 84, 85, 87, 88, 90, 92, 94, 96, 98, 1};
-    const std::vector<jfloat> j{0, 63, 65, 67, 69, 71, 73, 76, 79, 82, 85, 88, 91, 94, 97, 100, 1};
-    Floats short_spk(5, -1), long_hs(20, -1);
-    counters().reset();
-    EXPECT_EQ(Java_com_corvane_audio_Kova_get_1volumeTable(
-                  env(), nullptr, fake_jni::jfloats(short_spk), fake_jni::jfloats(long_hs)),
-              0);
-    EXPECT_EQ(short_spk.items, std::vector<jfloat>(b.begin(), b.begin() + 5));
-    EXPECT_EQ(std::vector<jfloat>(long_hs.items.begin(), long_hs.items.begin() + 17), j);
-    EXPECT_EQ(long_hs.items[17], -1);
-    EXPECT_EQ(counters().arrays_got, 2);
-    EXPECT_EQ(counters().arrays_released, 2);
-
-    Floats untouched(17, -1);
-    EXPECT_EQ(Java_com_corvane_audio_Kova_get_1volumeTable(env(), nullptr,
-                                                           fake_jni::jfloats(untouched), nullptr),
-              0);
-    EXPECT_EQ(untouched.items, std::vector<jfloat>(17, -1));
 }
 
 }  // namespace

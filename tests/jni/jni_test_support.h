@@ -197,6 +197,37 @@ inline void reset_to_unloaded() {
     }
 }
 
+using Lines = std::vector<std::string>;
+inline const std::string kPid = std::to_string(getpid());
+
+/* Tests that start from a freshly loaded library and leave it unloaded. */
+class Loaded : public ::testing::Test {
+   protected:
+    void SetUp() override {
+        reset_to_unloaded();
+        fake_jni::g_getenv_result = JNI_OK;
+        ASSERT_EQ(JNI_OnLoad(fake_jni::vm(), nullptr), JNI_VERSION_1_6);
+    }
+    void TearDown() override {
+        kova_mem_fail_after(-1);
+        reset_to_unloaded();
+    }
+};
+
+/* Takes the engine context away from the instance in `slot` (freeing it). */
+inline void drop_context(int slot) {
+    KovaInstance* inst = pKOVAInfo[slot].pInstance;
+    ASSERT_EQ(kova_deinit(inst->pCtx), 0);
+    inst->pCtx = nullptr;
+}
+
+/* Frees a slot the teardowns cannot free (no context) together with its record. */
+inline void discard(int slot) {
+    KovaInstance* inst = pKOVAInfo[slot].pInstance;
+    _KovaInfoDelbyKova(inst);
+    kova_mem_free(inst);
+}
+
 /* Raw 16-bit stereo PCM: a quiet sine that stays far from clipping after every gain stage. */
 class PcmFiles {
    public:

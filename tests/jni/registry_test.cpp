@@ -9,37 +9,11 @@
 
 namespace {
 
-using jni_test::deinit;
-using jni_test::init_default;
-using jni_test::jni_lines;
-using Lines = std::vector<std::string>;
-
-const std::string kPid = std::to_string(getpid());
-
-class Registry : public ::testing::Test {
-   protected:
-    void SetUp() override {
-        jni_test::reset_to_unloaded();
-        ASSERT_EQ(JNI_OnLoad(fake_jni::vm(), nullptr), JNI_VERSION_1_6);
-    }
-    void TearDown() override { jni_test::reset_to_unloaded(); }
-
-    /* Takes the engine context away from the instance in `slot` (freeing it). */
-    static void drop_context(int slot) {
-        KovaInstance* inst = pKOVAInfo[slot].pInstance;
-        ASSERT_EQ(kova_deinit(inst->pCtx), 0);
-        inst->pCtx = nullptr;
-    }
-    /* Frees a slot the sweeps cannot free (no context) together with its record. */
-    static void discard(int slot) {
-        KovaInstance* inst = pKOVAInfo[slot].pInstance;
-        _KovaInfoDelbyKova(inst);
-        kova_mem_free(inst);
-    }
-};
+using namespace jni_test;
+using Registry = Loaded;
 
 TEST(RegistrySlots, IndexAddAndDelbyKova) {
-    jni_test::reset_to_unloaded();
+    reset_to_unloaded();
     kova_test::LogCapture cap;
     pKOVAInfo[3] = KovaInfo{5, nullptr, 0};  // what static memory would not hold
     EXPECT_EQ(_KovaInfoGetIndex(), 0);
@@ -73,7 +47,7 @@ TEST(RegistrySlots, IndexAddAndDelbyKova) {
     }
     _KovaInfoDelbyKova(&a);
     EXPECT_EQ(_KovaInfoGetIndex(), 0);
-    jni_test::reset_to_unloaded();
+    reset_to_unloaded();
 }
 
 TEST_F(Registry, DelAllReportsEverySlotWithTheLastEngineResult) {

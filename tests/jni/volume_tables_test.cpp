@@ -1,8 +1,9 @@
-#include <gtest/gtest.h>
-
+// The volume tables: the rows handed out (directly and through the Java methods), and the shape
+// and known curves of every device and situation row.
 #include <array>
 #include <cmath>
 
+#include "jni/jni_test_support.h"
 #include "kova/kova_output.h"
 
 namespace {
@@ -30,6 +31,30 @@ TEST(VolumeTables, HandsOutRowOneOfSpeakerAndHeadsetOrNothing) {
     kova_get_volumetable(nullptr, other.data());
     kova_get_volumetable(other.data(), nullptr);
     EXPECT_EQ(other, untouched);
+}
+
+/* Java arrays of any length get at most one row each, never more than they hold; every array
+ * obtained is released. */
+TEST(VolumeTables, JavaArraysGetRowOneWithinTheirLength) {
+    using fake_jni::counters;
+    using Floats = fake_jni::Array<jfloat>;
+    Floats short_spk(5, -1), long_hs(20, -1);
+    counters().reset();
+    EXPECT_EQ(
+        Java_com_corvane_audio_Kova_get_1volumeTable(
+            fake_jni::env(), nullptr, fake_jni::jfloats(short_spk), fake_jni::jfloats(long_hs)),
+        0);
+    EXPECT_TRUE(std::equal(short_spk.items.begin(), short_spk.items.end(), kSpeakerRow1.begin()));
+    EXPECT_TRUE(std::equal(kHeadsetRow1.begin(), kHeadsetRow1.end(), long_hs.items.begin()));
+    EXPECT_EQ(long_hs.items[17], -1);
+    EXPECT_EQ(counters().arrays_got, 2);
+    EXPECT_EQ(counters().arrays_released, 2);
+
+    Floats untouched(17, -1);
+    EXPECT_EQ(Java_com_corvane_audio_Kova_get_1volumeTable(fake_jni::env(), nullptr,
+                                                           fake_jni::jfloats(untouched), nullptr),
+              0);
+    EXPECT_EQ(untouched.items, std::vector<jfloat>(17, -1));
 }
 
 TEST(VolumeTables, SizeIsSeventeenOnlyForSpeakerAndHeadsetCodes) {
