@@ -11,9 +11,10 @@
 #include <memory>
 #include <optional>
 
+#include "commands.h"
+#include "gesture.h"
 #include "output_file.h"
 #include "sources.h"
-#include "stroke.h"
 
 namespace kova_tool {
 namespace {
@@ -129,22 +130,31 @@ void wait_until(int64_t until, int64_t start, Status& status) {
 }  // namespace
 
 int run_play(Args& args) {
+    SetupOptions setup;
+    GestureOptions gesture;
     std::string device = "default";
     std::optional<std::string> capture;
-    const auto own = [&](const std::string& name) {
+    while (!args.done()) {
+        const std::string name(args.next());
+        if (name == "--help" || name == "-h") {
+            std::fprintf(out(), "%s\n%s\n%s", kHelp, kGestureHelp, kSetupHelp);
+            return kExitOk;
+        }
+        if (parse_setup_option(name, args, setup) || parse_gesture_option(name, args, gesture))
+            continue;
         if (name == "--device") {
             device = args.value(name);
         } else if (name == "--capture") {
             capture = args.value(name);
         } else {
-            return false;
+            usage_error("unknown option " + quoted(name) + " (see kova play --help)");
         }
-        return true;
-    };
-    StrokeCommand cmd;
-    if (!read_stroke_command(args, "play", kHelp, own, cmd)) return kExitOk;
-    const KOVA_FORMAT& fmt = cmd.format;
-    const std::vector<TouchEvent>& events = cmd.events;
+    }
+    finish_setup(setup);
+    set_library_chatter(setup.verbose);
+
+    const KOVA_FORMAT fmt = setup.format.format();
+    const std::vector<TouchEvent> events = load_gesture(gesture, fmt.w, fmt.h);
 
     char why[256] = "";
     const bool has_device = kova_host_alsa_probe(device.c_str(), why, sizeof why) == 0;
@@ -163,8 +173,8 @@ int run_play(Args& args) {
                 "); use --capture FILE to write the stream to a WAV file");
     }
 
-    Engine engine(cmd.setup.format);
-    prepare_set(engine, cmd.setup);
+    Engine engine(setup.format);
+    prepare_set(engine, setup);
 
     if (capture) {
         kova_host_use_capture_sink();
@@ -189,7 +199,7 @@ int run_play(Args& args) {
     std::fflush(out());
     kova_start_fasttrack(ft);
     Status status(ft, fmt);
-    EventBlock block;
+    std::vector<int16_t> block(kBlockBytes / 2);
     size_t blocks = 0, dropped = 0;
     uint64_t bytes_written = 0;
     const int64_t start = now_ms();
@@ -198,7 +208,7 @@ int run_play(Args& args) {
         wait_until(start + (e.time_ms - t0), start, status);
         if (g_interrupted.load()) break;
         if (e.action == KOVA_ACTION_START) status.stroke_begins();
-        const int32_t bytes = block.generate(engine.ctx(), e);
+        const int32_t bytes = generate_event(engine, e, block);
         if (bytes > 0) {
             const uint32_t n =
                 kova_write_fasttrack(ft, block.data(), kBlockBytes, static_cast<uint32_t>(bytes));

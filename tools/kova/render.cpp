@@ -3,10 +3,11 @@
 #include <optional>
 #include <tuple>
 
+#include "commands.h"
+#include "gesture.h"
 #include "output_file.h"
 #include "picture.h"
 #include "sources.h"
-#include "stroke.h"
 #include "timeline.h"
 #include "wav.h"
 
@@ -53,10 +54,19 @@ double peak_dbfs(const std::vector<int16_t>& pcm) {
 }  // namespace
 
 int run_render(Args& args) {
+    SetupOptions setup;
+    GestureOptions gesture;
     std::string output = "stroke.wav";
     std::optional<std::string> png;
     PictureOptions picture;
-    const auto own = [&](const std::string& name) {
+    while (!args.done()) {
+        const std::string name(args.next());
+        if (name == "--help" || name == "-h") {
+            std::fprintf(out(), "%s\n%s\n%s", kHelp, kGestureHelp, kSetupHelp);
+            return kExitOk;
+        }
+        if (parse_setup_option(name, args, setup) || parse_gesture_option(name, args, gesture))
+            continue;
         if (name == "-o" || name == "--output") {
             output = args.value(name);
         } else if (name == "--png") {
@@ -66,14 +76,14 @@ int run_render(Args& args) {
                 parse_size(name, args.value(name), kPictureMinWidth, kPictureMaxWidth,
                            kPictureMinHeight, kPictureMaxHeight);
         } else {
-            return false;
+            usage_error("unknown option " + quoted(name) + " (see kova render --help)");
         }
-        return true;
-    };
-    StrokeCommand cmd;
-    if (!read_stroke_command(args, "render", kHelp, own, cmd)) return kExitOk;
-    const KOVA_FORMAT& fmt = cmd.format;
-    const std::vector<TouchEvent>& events = cmd.events;
+    }
+    finish_setup(setup);
+    set_library_chatter(setup.verbose);
+
+    const KOVA_FORMAT fmt = setup.format.format();
+    const std::vector<TouchEvent> events = load_gesture(gesture, fmt.w, fmt.h);
     check_on_screen(events, fmt);
 
     // Both files are created first, so a folder that cannot be written fails before any work,
@@ -82,15 +92,15 @@ int run_render(Args& args) {
     std::unique_ptr<OutputFile> png_file;
     if (png) png_file = std::make_unique<OutputFile>(*png);
 
-    Engine engine(cmd.setup.format);
-    prepare_set(engine, cmd.setup);
+    Engine engine(setup.format);
+    prepare_set(engine, setup);
 
     Timeline timeline(fmt.sample_rate, fmt.channels);
-    EventBlock block;
+    std::vector<int16_t> block(kBlockBytes / 2);
     size_t moves = 0, silent_moves = 0;
     const size_t max_frames = static_cast<size_t>(kMaxRenderSeconds) * fmt.sample_rate;
     for (const TouchEvent& e : events) {
-        const int32_t bytes = block.generate(engine.ctx(), e);
+        const int32_t bytes = generate_event(engine, e, block);
         if (e.action == KOVA_ACTION_MOVE) {
             ++moves;
             if (bytes <= 0) ++silent_moves;

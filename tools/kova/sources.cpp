@@ -197,6 +197,12 @@ Engine::~Engine() {
     if (ctx_) kova_deinit(ctx_);
 }
 
+int32_t generate_event(const Engine& engine, const TouchEvent& e, std::vector<int16_t>& block) {
+    const KOVA_PARAM p{e.x, e.y, e.time_ms, e.aux, e.action};
+    KOVA_PCMBUF buf{block.data(), static_cast<int32_t>(block.size() * sizeof(int16_t))};
+    return kova_gen_sounds(engine.ctx(), &p, &buf);
+}
+
 std::string library_error(int32_t code) {
     const char* what = "unknown error";
     switch (code) {

@@ -5,7 +5,9 @@
 #include <kova/kova_types.h>
 
 #include <string>
+#include <vector>
 
+#include "gesture.h"
 #include "options.h"
 
 namespace kova_tool {
@@ -35,6 +37,10 @@ struct PreparedSet {
  * volume. Input files are checked first, so a missing or unreadable one fails with its own
  * reason rather than a bare library code. */
 PreparedSet prepare_set(Engine& engine, const SetupOptions& setup);
+
+/* Generates the block of one touch event into `block`; returns the bytes produced (0 when nothing
+ * sounds), as kova_gen_sounds does. */
+int32_t generate_event(const Engine& engine, const TouchEvent& e, std::vector<int16_t>& block);
 
 /* "source could not be loaded (-4)" and the like. */
 std::string library_error(int32_t code);
