@@ -1,6 +1,10 @@
+// The oscillator: periods, waveforms, the sample-block writer, refusals, and the block fill
+// (_osc_fill), which must hand out exactly what the same number of single calls would and leave
+// the oscillator in the same state.
 #include <gtest/gtest.h>
 
 #include <cmath>
+#include <cstring>
 #include <vector>
 
 #include "kova/kova_dsp.h"
@@ -55,14 +59,11 @@ TEST(Oscillator, WaveformsAtKnownPhases) {
     std::vector<double> s = take(sine, 8);
     for (int k = 0; k < 8; ++k) EXPECT_NEAR(s[k], std::sin(k * M_PI / 4), 1e-15) << k;
     EXPECT_EQ(s[0], 0.0);
-    for (KOVA_OSC* o : {sq, saw, sine}) kova_osc_deinit(o);
-}
 
-TEST(Oscillator, StereoHandsOutEachValueTwice) {
-    KOVA_OSC* osc = kova_osc_init(48000, 2, 2);
-    kova_osc_set_freq(osc, 6000.0);
-    EXPECT_EQ(take(osc, 8), (std::vector<double>{0, 0, .25, .25, .5, .5, .75, .75}));
-    kova_osc_deinit(osc);
+    KOVA_OSC* stereo = kova_osc_init(48000, 2, 2);  // each value handed out twice
+    kova_osc_set_freq(stereo, 6000.0);
+    EXPECT_EQ(take(stereo, 8), (std::vector<double>{0, 0, .25, .25, .5, .5, .75, .75}));
+    for (KOVA_OSC* o : {sq, saw, sine, stereo}) kova_osc_deinit(o);
 }
 
 TEST(Oscillator, GenSamplesScalesToFullScaleAndLeavesOddByte) {
@@ -87,6 +88,9 @@ TEST(Oscillator, RefusesBadHandlesAndArgumentsWithoutChangingThem) {
     EXPECT_EQ(kova_osc_set_freq(nullptr, 1.0), KOVA_ERR_INVALID_PARAM);
     EXPECT_EQ(kova_osc_get_sample(nullptr), -3.0);
     EXPECT_EQ(kova_osc_gen_samples(nullptr, buf, 4), KOVA_ERR_INVALID_PARAM);
+    double fill[2] = {1, 1};
+    _osc_fill(nullptr, fill, 2);
+    EXPECT_EQ(fill[1], -3.0);
 
     KOVA_OSC* osc = kova_osc_init(48000, 1, 1);
     EXPECT_EQ(kova_osc_gen_samples(osc, nullptr, 4), KOVA_ERR_INVALID_PARAM);
@@ -95,6 +99,9 @@ TEST(Oscillator, RefusesBadHandlesAndArgumentsWithoutChangingThem) {
     EXPECT_EQ(kova_osc_set_freq(osc, 440.0), KOVA_ERR_INVALID_PARAM);
     EXPECT_EQ(kova_osc_get_sample(osc), -3.0);
     EXPECT_EQ(kova_osc_gen_samples(osc, buf, 4), KOVA_ERR_INVALID_PARAM);
+    fill[0] = 1;
+    _osc_fill(osc, fill, 1);
+    EXPECT_EQ(fill[0], -3.0);
     EXPECT_EQ(kova_osc_deinit(osc), KOVA_ERR_INVALID_PARAM);  // not freed: ASan would see reuse
     EXPECT_EQ(buf[0], 5);
     EXPECT_EQ(osc->period, 4800);
@@ -111,6 +118,56 @@ TEST(Oscillator, AllocationFailureReportsAndReturnsNull) {
     EXPECT_EQ(osc, nullptr);
     EXPECT_EQ(testing::internal::GetCapturedStdout(),
               "KOVA_CTX malloc fail \nkova_osc_init() fail. err code (KOVA_ERR_INSUFF_MEM) \n");
+}
+
+struct OscPair {
+    KOVA_OSC* one;   // driven value by value
+    KOVA_OSC* fill;  // driven by _osc_fill
+    OscPair(uint32_t channels, uint32_t waveform)
+        : one(kova_osc_init(48000, channels, waveform)),
+          fill(kova_osc_init(48000, channels, waveform)) {}
+    ~OscPair() {
+        kova_osc_deinit(one);
+        kova_osc_deinit(fill);
+    }
+};
+
+// Bit patterns, so that -0.0 and 0.0 count as different values.
+bool same_bits(double a, double b) {
+    return std::memcmp(&a, &b, sizeof a) == 0;
+}
+
+TEST(OscFill, MatchesSingleValuesAndState) {
+    // Short periods (reused within a call), a period above the fill's table, a period shorter
+    // than the phase it inherits, and the one-sample cycle at the sample rate.
+    const double freqs[] = {1400.0, 13000.0, 30.0, 7000.0, 48000.0, 440.0};
+    const int64_t chunks[] = {1, 3, 256, 1000};
+    for (uint32_t channels : {1u, 2u}) {
+        for (uint32_t waveform : {0u, 1u, 2u}) {
+            OscPair p(channels, waveform);
+            ASSERT_NE(p.one, nullptr);
+            ASSERT_NE(p.fill, nullptr);
+            int64_t checked = 0;
+            for (double f : freqs) {
+                kova_osc_set_freq(p.one, f);
+                kova_osc_set_freq(p.fill, f);
+                for (int64_t n : chunks) {
+                    std::vector<double> got(static_cast<size_t>(n));
+                    _osc_fill(p.fill, got.data(), n);
+                    for (int64_t i = 0; i < n; ++i) {
+                        const double want = kova_osc_get_sample(p.one);
+                        ASSERT_TRUE(same_bits(got[i], want))
+                            << "channels " << channels << " waveform " << waveform << " freq " << f
+                            << " value " << i << ": " << got[i] << " vs " << want;
+                    }
+                    checked += n;
+                    ASSERT_EQ(p.fill->phase, p.one->phase);
+                    ASSERT_EQ(p.fill->hold, p.one->hold);
+                }
+            }
+            EXPECT_EQ(checked, 6 * 1260);
+        }
+    }
 }
 
 }  // namespace
