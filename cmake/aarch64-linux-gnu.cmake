@@ -17,8 +17,30 @@ set(CMAKE_FIND_ROOT_PATH_MODE_LIBRARY ONLY)
 set(CMAKE_FIND_ROOT_PATH_MODE_INCLUDE ONLY)
 set(CMAKE_FIND_ROOT_PATH_MODE_PACKAGE ONLY)
 
+# libbacktrace:arm64 (behind libutils) needs 7z.so, which Debian has only for the host
+# architecture; a stub of our own takes its place at link time and under qemu (see
+# aarch64-7z-stub.c).
+set(KOVA_AARCH64_STUBS ${CMAKE_BINARY_DIR}/aarch64-stubs)
+if(NOT EXISTS ${KOVA_AARCH64_STUBS}/7z.so)
+    file(MAKE_DIRECTORY ${KOVA_AARCH64_STUBS})
+    execute_process(
+        COMMAND aarch64-linux-gnu-gcc -shared -fPIC -O2 -o ${KOVA_AARCH64_STUBS}/7z.so
+                ${CMAKE_CURRENT_LIST_DIR}/aarch64-7z-stub.c
+        RESULT_VARIABLE KOVA_STUB_RESULT)
+    if(NOT KOVA_STUB_RESULT EQUAL 0)
+        message(FATAL_ERROR "cannot build the AArch64 7z.so stub")
+    endif()
+endif()
+set(CMAKE_EXE_LINKER_FLAGS_INIT "-Wl,-rpath-link,${KOVA_AARCH64_STUBS}")
+set(CMAKE_SHARED_LINKER_FLAGS_INIT "-Wl,-rpath-link,${KOVA_AARCH64_STUBS}")
+
+# Binaries run against the multiarch arm64 runtime (libc6:arm64, libstdc++6:arm64, installed with
+# the arm64 packages), loader included: qemu's prefix is "/". The cross toolchain's own copy of
+# libc under /usr/aarch64-linux-gnu may be an older release than libc6:arm64, and a loader of one
+# release with a libc of another hangs in the first pthread_create.
 find_program(KOVA_QEMU_AARCH64 qemu-aarch64 REQUIRED)
-set(CMAKE_CROSSCOMPILING_EMULATOR ${KOVA_QEMU_AARCH64} -L /usr/aarch64-linux-gnu)
+set(CMAKE_CROSSCOMPILING_EMULATOR ${KOVA_QEMU_AARCH64} -L /
+                                  -E LD_LIBRARY_PATH=${KOVA_AARCH64_STUBS})
 
 # The library uses only the JNI headers, which are the same for every 64-bit Linux; no arm64 JVM is
 # needed. Point FindJNI at the host JDK's headers and give it placeholders for the libraries it

@@ -14,7 +14,7 @@ cd "$root"
 jobs=${KOVA_JOBS:-$(nproc)}
 host_dir=${1:-build}
 dir=build-rel-aarch64
-qemu=(qemu-aarch64 -L /usr/aarch64-linux-gnu)
+qemu=(qemu-aarch64 -L / -E "LD_LIBRARY_PATH=$root/$dir/aarch64-stubs")
 
 scripts/setup.sh
 

@@ -68,13 +68,16 @@ stage_done "asan/ubsan build + ctest"
 
 if ! skipped tsan; then
     # The suites where threads meet: the output stream and its device thread, the instance
-    # registry and its lock, the Java-facing layer, and the soak of several instances.
+    # registry and its lock, the Java-facing layer, the soak of several instances, and any
+    # other suite that starts threads.
     echo "== build-rel-tsan: threaded suites under ThreadSanitizer"
     dir=build-rel-tsan
     cmake -S . -B "$dir" -DCMAKE_BUILD_TYPE=RelWithDebInfo -DKOVA_SANITIZE=thread \
         -DKOVA_BUILD_JAVA=OFF -DKOVA_BUILD_TOOLS=OFF -DKOVA_BUILD_BENCH=OFF >/dev/null
-    mapfile -t tsan_targets < <(ls tests/jni/*_test.cpp tests/soak/*_test.cpp 2>/dev/null |
-        xargs -n1 basename | sed 's/\.cpp$//')
+    # tests/jni and tests/soak, plus any other suite that starts threads itself.
+    mapfile -t tsan_targets < <({ ls tests/jni/*_test.cpp tests/soak/*_test.cpp 2>/dev/null
+        grep -rlE --include='*_test.cpp' 'std::thread|std::async|pthread_create' tests; } |
+        xargs -n1 basename | sed 's/\.cpp$//' | sort -u)
     cmake --build "$dir" -j "$jobs" --target "${tsan_targets[@]}" >"$dir.build.log" 2>&1 ||
         { tail -n 60 "$dir.build.log"; exit 1; }
     # Every test of those suites runs (KOVA_TSAN_PATTERN narrows them to a ctest -R regex).
