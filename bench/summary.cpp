@@ -1,5 +1,7 @@
 #include "summary.h"
 
+#include <unistd.h>
+
 #include <algorithm>
 #include <cstdio>
 #include <sstream>
@@ -28,6 +30,9 @@ Measured measured_of(const benchmark::BenchmarkReporter::Run& run) {
 }
 
 }  // namespace
+
+CollectingReporter::CollectingReporter()
+    : ConsoleReporter(isatty(STDOUT_FILENO) ? OO_ColorTabular : OO_Tabular) {}
 
 void CollectingReporter::ReportRuns(const std::vector<Run>& runs) {
     for (const Run& run : runs) {

@@ -23,6 +23,8 @@ using Results = std::map<std::string, Measured>;
 // Console output as usual, and every result kept for the summary.
 class CollectingReporter : public benchmark::ConsoleReporter {
    public:
+    // Colours only on a terminal (a reporter passed in does not see --benchmark_color).
+    CollectingReporter();
     void ReportRuns(const std::vector<Run>& runs) override;
     const Results& results() const { return results_; }
 
