@@ -3,14 +3,15 @@
 # (kova_bench, with repetitions; the summary tables at the end give medians and ratios) and the
 # Java benchmark of gen_tofasttrack. Figures are noisy on a busy machine: check `uptime` first.
 #
-#   scripts/bench.sh                 # full run, 5 repetitions
+#   scripts/bench.sh                 # full run: 10 repetitions of 0.2 s each, medians
 #   BENCH_REPS=1 scripts/bench.sh    # quick look
 #   scripts/bench.sh --benchmark_filter=resample   # extra flags go to kova_bench
 set -euo pipefail
 root=$(cd "$(dirname "$0")/.." && pwd)
 cd "$root"
 build=${BENCH_BUILD_DIR:-build-bench}
-reps=${BENCH_REPS:-5}
+reps=${BENCH_REPS:-10}
+min_time=${BENCH_MIN_TIME:-0.2}
 jobs=${KOVA_JOBS:-$(nproc)}
 
 scripts/setup.sh
@@ -29,7 +30,10 @@ out="$build/bench-results.txt"
     echo
 } | tee "$out"
 
-"$build/bench/kova_bench" --benchmark_repetitions="$reps" --benchmark_report_aggregates_only=true \
+# Repetitions run in random order, so that a change in the machine's load during the run spreads
+# over the library and its peers alike instead of favouring whichever ran in the quiet moment.
+"$build/bench/kova_bench" --benchmark_repetitions="$reps" --benchmark_min_time="$min_time" \
+    --benchmark_enable_random_interleaving=true --benchmark_report_aggregates_only=true \
     --benchmark_color=false "$@" 2>&1 | tee -a "$out"
 
 java_bin=java
