@@ -1,6 +1,8 @@
 /* kova save and kova inspect: a saved set read back through the file queries, as JSON. */
 #include <gtest/gtest.h>
 
+#include <sstream>
+
 #include "support/json_read.h"
 #include "support/tool_run.h"
 
@@ -22,6 +24,18 @@ const std::vector<std::string> kSaveArgs = {
     "0.6",         "--start-gain", "0.5",         "--loop-gain", "0.8",
     "--end-gain",  "0.7",          "--repeat",    "loop=100:900"};
 
+/* The object's fields named in `keys` (separated by spaces) hold `values`, in that order. */
+void expect_numbers(const Json& object, const std::string& keys,
+                    const std::vector<double>& values) {
+    std::istringstream names(keys);
+    std::string key;
+    for (double value : values) {
+        ASSERT_TRUE(names >> key);
+        EXPECT_EQ(object[key].n, value) << key;
+    }
+    EXPECT_FALSE(names >> key) << "no value for " << key;
+}
+
 TEST(KovaSaveInspect, JsonShowsWhatWasSaved) {
     TempDir dir;
     RunResult r = run_kova(kSaveArgs, dir.path());
@@ -32,44 +46,26 @@ TEST(KovaSaveInspect, JsonShowsWhatWasSaved) {
     ASSERT_TRUE(parse_json(r.out, j)) << r.out;
 
     const int first = kCount + 2 * kFilter + kTune + kInfo + kRecord;
+    const int loop_at = first + kStartBytes + kRecord, end_at = loop_at + kLoopBytes + kRecord;
     const Json& slots = j["slots"];
-    EXPECT_EQ(slots["start"]["offset"].n, first);
-    EXPECT_EQ(slots["start"]["size"].n, kStartBytes);
-    EXPECT_EQ(slots["loop"]["offset"].n, first + kStartBytes + kRecord);
-    EXPECT_EQ(slots["loop"]["size"].n, kLoopBytes);
-    EXPECT_EQ(slots["end"]["offset"].n, first + kStartBytes + kRecord + kLoopBytes + kRecord);
-    EXPECT_EQ(slots["end"]["size"].n, kEndBytes);
-    EXPECT_EQ(file_size(dir.file("set.kset")), slots["end"]["offset"].n + kEndBytes);
-    EXPECT_EQ(slots["start"]["length_ms"].n, 80);
-    EXPECT_EQ(slots["loop"]["length_ms"].n, 1000);
-    EXPECT_EQ(slots["loop"]["repeat_start_ms"].n, 100);
-    EXPECT_EQ(slots["loop"]["repeat_end_ms"].n, 900);
-    EXPECT_EQ(slots["end"]["repeat_end_ms"].n, 120);
+    expect_numbers(slots["start"], "offset size length_ms", {first, kStartBytes, 80});
+    expect_numbers(slots["loop"], "offset size length_ms repeat_start_ms repeat_end_ms",
+                   {loop_at, kLoopBytes, 1000, 100, 900});
+    expect_numbers(slots["end"], "offset size repeat_end_ms", {end_at, kEndBytes, 120});
+    EXPECT_EQ(file_size(dir.file("set.kset")), end_at + kEndBytes);
 
     const Json& filters = j["filters"];
     ASSERT_EQ(filters.items.size(), 2u);
     EXPECT_EQ(filters[0]["type"].s, "lowpass");
     EXPECT_EQ(filters[0]["freq"].n, 6000);
     EXPECT_EQ(filters[1]["type"].s, "bandpass");
-    EXPECT_EQ(filters[1]["freq"].n, 2000);
-    EXPECT_EQ(filters[1]["bandwidth"].n, 1000);
-    EXPECT_EQ(filters[1]["enable"].n, 1);
-    EXPECT_EQ(filters[1]["samplerate"].n, 48000);
-    EXPECT_EQ(filters[1]["channels"].n, 2);
-
-    const Json& t = j["tune"];
-    EXPECT_EQ(t["gain"].n, 0.7);
-    EXPECT_EQ(t["pan"].n, 0.3);
-    EXPECT_EQ(t["osc_enable"].n, 1);
-    EXPECT_EQ(t["osc_depth"].n, 0.5);
-    EXPECT_EQ(t["sharp_enable"].n, 1);
-    EXPECT_EQ(t["sharpness"].n, 0.25);
-    EXPECT_EQ(t["start_gain"].n, 0.5);
-    EXPECT_EQ(t["loop_gain"].n, 0.8);
-    EXPECT_EQ(t["end_gain"].n, 0.7);
+    expect_numbers(filters[1], "freq bandwidth enable samplerate channels",
+                   {2000, 1000, 1, 48000, 2});
     // Read back, a noise level lives in file_gain: the saved set plays its loop as loud.
-    EXPECT_EQ(t["file_gain"].n, 0.6);
-    EXPECT_EQ(t["wn_gain"].n, 0.0);
+    expect_numbers(j["tune"],
+                   "gain pan osc_enable osc_depth sharp_enable sharpness start_gain loop_gain "
+                   "end_gain file_gain wn_gain",
+                   {0.7, 0.3, 1, 0.5, 1, 0.25, 0.5, 0.8, 0.7, 0.6, 0.0});
 }
 
 TEST(KovaSaveInspect, TextListsSlotsFiltersAndTune) {

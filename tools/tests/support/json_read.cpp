@@ -2,120 +2,96 @@
 
 #include <cctype>
 #include <cstdlib>
+#include <cstring>
 
 namespace kova_test {
 namespace {
 
 const Json kNull{};
 
-class Parser {
-   public:
-    explicit Parser(const std::string& t) : t_(t) {}
+/* Recursive descent over the text; every step returns false at a syntax error. */
+struct Parser {
+    const std::string& t;
+    size_t i = 0;
 
-    bool document(Json& out) {
-        if (!value(out)) return false;
-        space();
-        return i_ == t_.size();
-    }
-
-   private:
     void space() {
-        while (i_ < t_.size() && std::isspace(static_cast<unsigned char>(t_[i_]))) ++i_;
+        while (i < t.size() && std::isspace(static_cast<unsigned char>(t[i]))) ++i;
     }
-    bool literal(const char* word) {
-        const std::string w(word);
-        if (t_.compare(i_, w.size(), w) != 0) return false;
-        i_ += w.size();
+    bool eat(char c) {
+        space();
+        if (i >= t.size() || t[i] != c) return false;
+        ++i;
+        return true;
+    }
+    bool word(const char* w) {
+        const size_t n = std::strlen(w);
+        if (t.compare(i, n, w) != 0) return false;
+        i += n;
         return true;
     }
     bool string(std::string& s) {
-        if (t_[i_] != '"') return false;
-        ++i_;
-        while (i_ < t_.size() && t_[i_] != '"') {
-            if (static_cast<unsigned char>(t_[i_]) < 0x20) return false;
-            if (t_[i_] == '\\') {
-                if (++i_ >= t_.size()) return false;
-                const char e = t_[i_];
-                if (e == 'u') {
-                    if (i_ + 4 >= t_.size()) return false;
-                    s += static_cast<char>(std::strtol(t_.substr(i_ + 1, 4).c_str(), nullptr, 16));
-                    i_ += 4;
-                } else if (e == 'n') {
-                    s += '\n';
-                } else if (e == '"' || e == '\\' || e == '/') {
-                    s += e;
-                } else {
+        if (!eat('"')) return false;
+        while (i < t.size() && t[i] != '"') {
+            char c = t[i++];
+            if (static_cast<unsigned char>(c) < 0x20) return false;
+            if (c == '\\') {
+                if (i >= t.size()) return false;
+                c = t[i++];
+                if (c == 'u') {
+                    if (i + 4 > t.size()) return false;
+                    c = static_cast<char>(std::strtol(t.substr(i, 4).c_str(), nullptr, 16));
+                    i += 4;
+                } else if (c == 'n') {
+                    c = '\n';
+                } else if (c != '"' && c != '\\' && c != '/') {
                     return false;
                 }
-                ++i_;
-                continue;
             }
-            s += t_[i_++];
+            s += c;
         }
-        if (i_ >= t_.size()) return false;
-        ++i_;
-        return true;
+        return eat('"');
+    }
+    /* The items of an array or object up to `close`, separated by commas. */
+    template <typename Item>
+    bool items(char close, Item item) {
+        if (eat(close)) return true;
+        do {
+            if (!item()) return false;
+        } while (eat(','));
+        return eat(close);
     }
     bool value(Json& v) {
         space();
-        if (i_ >= t_.size()) return false;
-        const char c = t_[i_];
-        if (c == '{') {
+        if (eat('{')) {
             v.kind = Json::Object;
-            ++i_;
-            space();
-            if (i_ < t_.size() && t_[i_] == '}') return ++i_, true;
-            for (;;) {
-                space();
+            return items('}', [&] {
                 std::string key;
-                if (i_ >= t_.size() || !string(key)) return false;
-                space();
-                if (i_ >= t_.size() || t_[i_++] != ':') return false;
-                if (!value(v.fields[key])) return false;
-                space();
-                if (i_ >= t_.size()) return false;
-                if (t_[i_] == ',') {
-                    ++i_;
-                    continue;
-                }
-                return t_[i_++] == '}';
-            }
+                return string(key) && eat(':') && value(v.fields[key]);
+            });
         }
-        if (c == '[') {
+        if (eat('[')) {
             v.kind = Json::Array;
-            ++i_;
-            space();
-            if (i_ < t_.size() && t_[i_] == ']') return ++i_, true;
-            for (;;) {
-                v.items.emplace_back();
-                if (!value(v.items.back())) return false;
-                space();
-                if (i_ >= t_.size()) return false;
-                if (t_[i_] == ',') {
-                    ++i_;
-                    continue;
-                }
-                return t_[i_++] == ']';
-            }
+            return items(']', [&] { return value(v.items.emplace_back()); });
         }
-        if (c == '"') {
+        if (i < t.size() && t[i] == '"') {
             v.kind = Json::String;
             return string(v.s);
         }
-        if (literal("true")) return v.kind = Json::Bool, v.b = true, true;
-        if (literal("false")) return v.kind = Json::Bool, v.b = false, true;
-        if (literal("null")) return v.kind = Json::Null, true;
-        const char* start = t_.c_str() + i_;
+        const bool is_true = word("true");
+        if (is_true || word("false")) {
+            v.kind = Json::Bool;
+            v.b = is_true;
+            return true;
+        }
+        if (word("null")) return true;
+        const char* start = t.c_str() + i;
         char* end = nullptr;
         v.n = std::strtod(start, &end);
         if (end == start) return false;
         v.kind = Json::Number;
-        i_ += static_cast<size_t>(end - start);
+        i += static_cast<size_t>(end - start);
         return true;
     }
-
-    const std::string& t_;
-    size_t i_ = 0;
 };
 
 }  // namespace
@@ -131,7 +107,10 @@ const Json& Json::operator[](size_t i) const {
 
 bool parse_json(const std::string& text, Json& out) {
     out = Json{};
-    return Parser(text).document(out);
+    Parser p{text};
+    if (!p.value(out)) return false;
+    p.space();
+    return p.i == text.size();
 }
 
 }  // namespace kova_test
