@@ -243,6 +243,25 @@ bool parse_gesture_option(std::string_view name, Args& args, GestureOptions& g) 
     return true;
 }
 
+bool read_gesture_command(Args& args, const char* command, const char* help, SetupOptions& setup,
+                          GestureOptions& gesture,
+                          const std::function<bool(const std::string&)>& own) {
+    while (!args.done()) {
+        const std::string name(args.next());
+        if (name == "--help" || name == "-h") {
+            std::fprintf(out(), "%s\n%s\n%s", help, kGestureHelp, kSetupHelp);
+            return false;
+        }
+        if (!parse_setup_option(name, args, setup) && !parse_gesture_option(name, args, gesture) &&
+            !own(name)) {
+            usage_error("unknown option " + quoted(name) + " (see kova " + command + " --help)");
+        }
+    }
+    finish_setup(setup);
+    set_library_chatter(setup.verbose);
+    return true;
+}
+
 void finish_setup(SetupOptions& s) {
     FormatOptions& f = s.format;
     if (f.panning.value_or(false) && f.channels != 2) {

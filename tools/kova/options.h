@@ -7,6 +7,7 @@
 
 #include <array>
 #include <cstdint>
+#include <functional>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -101,6 +102,14 @@ bool parse_gesture_option(std::string_view name, Args& args, GestureOptions& ges
 
 /* Cross-checks once every option is read (panning needs stereo, filters need the rate, ...). */
 void finish_setup(SetupOptions& setup);
+
+/* The command line of a gesture command (render, play): --help prints `help` with the shared
+ * help and returns false; the shared options are taken here, any other by `own`, which returns
+ * false for a name that is not its own (a usage error naming `command`). Then the setup is
+ * cross-checked and the library's chatter set. */
+bool read_gesture_command(Args& args, const char* command, const char* help, SetupOptions& setup,
+                          GestureOptions& gesture,
+                          const std::function<bool(const std::string&)>& own);
 
 /* Help text of the shared options. */
 extern const char* const kSetupHelp;

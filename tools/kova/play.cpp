@@ -134,24 +134,17 @@ int run_play(Args& args) {
     GestureOptions gesture;
     std::string device = "default";
     std::optional<std::string> capture;
-    while (!args.done()) {
-        const std::string name(args.next());
-        if (name == "--help" || name == "-h") {
-            std::fprintf(out(), "%s\n%s\n%s", kHelp, kGestureHelp, kSetupHelp);
-            return kExitOk;
-        }
-        if (parse_setup_option(name, args, setup) || parse_gesture_option(name, args, gesture))
-            continue;
+    const auto own = [&](const std::string& name) {
         if (name == "--device") {
             device = args.value(name);
         } else if (name == "--capture") {
             capture = args.value(name);
         } else {
-            usage_error("unknown option " + quoted(name) + " (see kova play --help)");
+            return false;
         }
-    }
-    finish_setup(setup);
-    set_library_chatter(setup.verbose);
+        return true;
+    };
+    if (!read_gesture_command(args, "play", kHelp, setup, gesture, own)) return kExitOk;
 
     const KOVA_FORMAT fmt = setup.format.format();
     const std::vector<TouchEvent> events = load_gesture(gesture, fmt.w, fmt.h);

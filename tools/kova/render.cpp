@@ -59,14 +59,7 @@ int run_render(Args& args) {
     std::string output = "stroke.wav";
     std::optional<std::string> png;
     PictureOptions picture;
-    while (!args.done()) {
-        const std::string name(args.next());
-        if (name == "--help" || name == "-h") {
-            std::fprintf(out(), "%s\n%s\n%s", kHelp, kGestureHelp, kSetupHelp);
-            return kExitOk;
-        }
-        if (parse_setup_option(name, args, setup) || parse_gesture_option(name, args, gesture))
-            continue;
+    const auto own = [&](const std::string& name) {
         if (name == "-o" || name == "--output") {
             output = args.value(name);
         } else if (name == "--png") {
@@ -76,11 +69,11 @@ int run_render(Args& args) {
                 parse_size(name, args.value(name), kPictureMinWidth, kPictureMaxWidth,
                            kPictureMinHeight, kPictureMaxHeight);
         } else {
-            usage_error("unknown option " + quoted(name) + " (see kova render --help)");
+            return false;
         }
-    }
-    finish_setup(setup);
-    set_library_chatter(setup.verbose);
+        return true;
+    };
+    if (!read_gesture_command(args, "render", kHelp, setup, gesture, own)) return kExitOk;
 
     const KOVA_FORMAT fmt = setup.format.format();
     const std::vector<TouchEvent> events = load_gesture(gesture, fmt.w, fmt.h);
