@@ -98,29 +98,6 @@ class KovaTest {
         assertEquals(1, open());
     }
 
-    @Test
-    void badIdsAndFreeSlotsChangeNothing() throws IOException {
-        String loop = pcmFile("loop.pcm", 19200, 220);
-        byte[] out = new byte[4096];
-        Arrays.fill(out, (byte) 0x5a);
-        for (long id : new long[] {0, -5, 21, 9}) {
-            assertEquals(-3, Kova.reg_src_byfiles(id, null, loop, null));
-            assertEquals(-3, Kova.set_src(id, 1));
-            assertEquals(0, Kova.get_src_num(id));
-            assertEquals(0, Kova.gen_sounds(id, out, 10, 10, 0, 0, Kova.ACTION_START));
-            assertEquals(0, Kova.gen_tofasttrack(id, 10, 10, 0, 0, Kova.ACTION_START));
-            assertEquals(-3, Kova.set_tuneset(id, 1, 1, 1, 0, 1, 0, 1, 1, 1, 1, 1, 1));
-            assertEquals(-3, Kova.set_thickness(id, 0.5));
-            assertEquals(-3, Kova.set_volume(id, 0.5));
-            Kova.start_fasttrack(id);
-            Kova.stop_fasttrack(id);
-        }
-        byte[] untouched = new byte[4096];
-        Arrays.fill(untouched, (byte) 0x5a);
-        assertArrayEquals(untouched, out);
-        assertEquals(List.of(), KovaTestHooks.logs());
-    }
-
     /** Arguments arrive in their declared order and kinds: the logged values show it. */
     @Test
     void selectionAndControls() throws IOException {
