@@ -141,7 +141,7 @@ TEST_F(Lifecycle, FailedInitReleasesEverythingAndLeavesNoSlot) {
     EXPECT_EQ(gpKovaMutex, nullptr);
 }
 
-TEST_F(Lifecycle, RefusedTeardownKeepsTheSlotUntilARetrySucceeds) {
+TEST_F(Lifecycle, RefusedTeardownsKeepTheSlot) {
     ASSERT_EQ(init_default(), 1);
     KovaInstance* inst = pKOVAInfo[0].pInstance;
     inst->pCtx->tag = 0;  // the engine no longer recognises the context
@@ -165,11 +165,10 @@ TEST_F(Lifecycle, RefusedTeardownKeepsTheSlotUntilARetrySucceeds) {
     EXPECT_EQ(deinit(1), 0);
     EXPECT_EQ(jni_lines(cap), (Lines{"kova_deinit()", "kova_deinit(id:1, pid:" + kPid + ")"}));
     EXPECT_EQ(pKOVAInfo[0].isUsed, 0);
-}
 
-TEST_F(Lifecycle, DeinitOfAnInstanceWithoutContextReportsIt) {
+    // Without an engine context the teardown reports it and keeps the slot as well.
     ASSERT_EQ(init_default(), 1);
-    KovaInstance* inst = pKOVAInfo[0].pInstance;
+    inst = pKOVAInfo[0].pInstance;
     drop_context(0);
     cap.clear();
     EXPECT_EQ(deinit(1), -3);
@@ -180,27 +179,20 @@ TEST_F(Lifecycle, DeinitOfAnInstanceWithoutContextReportsIt) {
     discard(0);
 }
 
-TEST_F(Lifecycle, UnloadTearsDownLiveInstancesButKeepsRefusedOnes) {
+/* The unload hook runs the teardown of every slot (whose lines and refusals the registry tests
+ * check in full), and leaves the lock alive and unlocked. */
+TEST_F(Lifecycle, UnloadTearsDownEveryInstanceAndKeepsTheLock) {
     ASSERT_EQ(init_default(), 1);
-    ASSERT_EQ(init_default(), 2);
-    KovaInstance* refused = pKOVAInfo[1].pInstance;
-    refused->pCtx->tag = 0;
     pthread_mutex_t* lock = gpKovaMutex;
     cap.clear();
     JNI_OnUnload(fake_jni::vm(), nullptr);
     EXPECT_EQ(jni_lines(cap),
               (Lines{"KOVA_JNI_OnUnload()", "_KovaInfoDelAll()",
-                     "kova_deinit[0](pid:" + kPid + ") is finished successfully(all)",
-                     "kova_deinit[1](pid:" + kPid + ") is already completed(all)"}));
+                     "kova_deinit[0](pid:" + kPid + ") is finished successfully(all)"}));
     EXPECT_EQ(pKOVAInfo[0].isUsed, 0);
-    EXPECT_EQ(pKOVAInfo[1].isUsed, 1);
-    EXPECT_EQ(refused->pFastTrack, nullptr);
-    EXPECT_EQ(refused->pcm.data, nullptr);
-    // The sweep's own try-lock was released, and the lock itself survives.
     EXPECT_EQ(gpKovaMutex, lock);
     EXPECT_EQ(pthread_mutex_trylock(lock), 0);
     pthread_mutex_unlock(lock);
-    refused->pCtx->tag = KOVA_CTX_TAG;
 }
 
 }  // namespace
