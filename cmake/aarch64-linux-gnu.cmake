@@ -31,8 +31,8 @@ if(NOT EXISTS ${KOVA_AARCH64_STUBS}/7z.so)
         message(FATAL_ERROR "cannot build the AArch64 7z.so stub")
     endif()
 endif()
-set(CMAKE_EXE_LINKER_FLAGS_INIT "-Wl,-rpath-link,${KOVA_AARCH64_STUBS}")
-set(CMAKE_SHARED_LINKER_FLAGS_INIT "-Wl,-rpath-link,${KOVA_AARCH64_STUBS}")
+# A directory link option rather than *_LINKER_FLAGS_INIT, which only a first configure reads.
+add_link_options(-Wl,-rpath-link,${KOVA_AARCH64_STUBS})
 
 # Binaries run against the multiarch arm64 runtime (libc6:arm64, libstdc++6:arm64, installed with
 # the arm64 packages), loader included: qemu's prefix is "/". The cross toolchain's own copy of
