@@ -29,8 +29,8 @@ enum SourceKind : uint8_t { kSourceFiles = 0, kSourceFilter = 1, kSourceBoth = 2
 
 // Opcodes (taken modulo kOpCount, events weighted by four codes).
 enum Op : uint8_t {
-    kOpEvent = 0,  // 0..3: u8 flags, coordinates, time, buffer size (see EventFlags)
-    kOpTune = 4,   // u8 raw?; raw: 88-byte record image; else 11 scaled bytes
+    kOpEvent = 0,      // 0..3: u8 flags, coordinates, time, buffer size (see EventFlags)
+    kOpTune = 4,       // u8 raw?; raw: 88-byte record image; else 11 scaled bytes
     kOpThickness = 5,  // u8 raw?; raw: f64; else u8 scaled to -0.1..1.1
     kOpVolume = 6,     // same encoding as thickness
     kOpAdmin = 7,      // u8 sub-op (see AdminOp), operands
@@ -43,12 +43,12 @@ constexpr uint8_t kEvRawXY = 0x04;       // f32 x, f32 y follow; else i16 dx, i1
 constexpr uint8_t kEvRawTime = 0x08;     // i64 time follows; else u8 dt in ms
 
 enum AdminOp : uint8_t {
-    kAdminSelect = 0,   // i8 identifier
+    kAdminSelect = 0,     // i8 identifier
     kAdminRegFilter = 1,  // filter record
-    kAdminAttach = 2,   // filter record
-    kAdminUpdate = 3,   // filter record
-    kAdminRepeat = 4,   // i16 x 9: len, start, end ms per slot
-    kAdminResave = 5,   // none: save the active set and register the file again
+    kAdminAttach = 2,     // filter record
+    kAdminUpdate = 3,     // filter record
+    kAdminRepeat = 4,     // i16 x 9: len, start, end ms per slot
+    kAdminResave = 5,     // none: save the active set and register the file again
     kAdminCount = 6,
 };
 

@@ -38,7 +38,8 @@ void check_tuneset(const char* path, const uint8_t* data, size_t size) {
     if (at < 0 || static_cast<uint64_t>(at) + sizeof(KOVA_TUNE_SET) > size) return;
     KOVA_TUNE_SET stored;
     std::memcpy(&stored, data + at, sizeof stored);
-    if (!(stored.file_gain > 0.0) && !std::isnan(stored.file_gain)) stored.file_gain = stored.wn_gain;
+    if (!(stored.file_gain > 0.0) && !std::isnan(stored.file_gain))
+        stored.file_gain = stored.wn_gain;
     stored.wn_gain = 0.0;
     FUZZ_CHECK(same_tune(tune, stored));
 }
@@ -76,7 +77,8 @@ void check_filters(const char* path) {
     for (auto& d : flt) d.type = 99;  // marks an element the query did not write
     const int rc = kova_get_filters_fromfile(path, flt);
     FUZZ_CHECK(rc == KOVA_OK || rc == KOVA_ERR_INVALID_PARAM || rc == KOVA_ERR_INSUFF_MEM);
-    for (uint32_t i = 0; i < KOVA_FLT_TYPE_COUNT; ++i) FUZZ_CHECK(flt[i].type == 99 || flt[i].type == i);
+    for (uint32_t i = 0; i < KOVA_FLT_TYPE_COUNT; ++i)
+        FUZZ_CHECK(flt[i].type == 99 || flt[i].type == i);
 }
 
 void check_rptinfo(const char* path) {

@@ -17,7 +17,9 @@ using namespace kova_fuzz;
 
 namespace {
 
-double scaled(uint8_t b, double lo, double hi) { return lo + (hi - lo) * b / 255.0; }
+double scaled(uint8_t b, double lo, double hi) {
+    return lo + (hi - lo) * b / 255.0;
+}
 
 // Deterministic PCM for a file source: a ramp with a little noise; amplitude 255 gives a
 // full-scale square wave that drives the clipper.

@@ -20,8 +20,7 @@ using namespace kova_fuzz;
 namespace {
 
 constexpr int32_t kSlotLimit[KOVA_SLOT_COUNT] = {KOVA_SLOT_START_MAX_BYTES,
-                                                 KOVA_SLOT_LOOP_MAX_BYTES,
-                                                 KOVA_SLOT_END_MAX_BYTES};
+                                                 KOVA_SLOT_LOOP_MAX_BYTES, KOVA_SLOT_END_MAX_BYTES};
 
 void check_load(const ScratchFile& file, const uint8_t* bytes, size_t size) {
     for (int slot = -1; slot <= KOVA_SLOT_COUNT; ++slot) {
@@ -56,9 +55,8 @@ void check_load(const ScratchFile& file, const uint8_t* bytes, size_t size) {
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
-    static const ScratchFile files[KOVA_SLOT_COUNT] = {ScratchFile("pcm-start"),
-                                                       ScratchFile("pcm-loop"),
-                                                       ScratchFile("pcm-end")};
+    static const ScratchFile files[KOVA_SLOT_COUNT] = {
+        ScratchFile("pcm-start"), ScratchFile("pcm-loop"), ScratchFile("pcm-end")};
     Bytes in(data, size);
     // Lengths of the start and end files in 256-byte units plus a remainder: seeds reach every
     // limit while small inputs still make small files.

@@ -35,9 +35,13 @@ ScratchFile::ScratchFile(const char* tag) {
             std::to_string(getpid()) + "-" + tag;
 }
 
-ScratchFile::~ScratchFile() { remove(); }
+ScratchFile::~ScratchFile() {
+    remove();
+}
 
-void ScratchFile::remove() const { unlink(path_.c_str()); }
+void ScratchFile::remove() const {
+    unlink(path_.c_str());
+}
 
 void ScratchFile::rewrite(const void* data, size_t size) const {
     const int fd = open(path_.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0600);
@@ -129,16 +133,20 @@ bool same_tune(const KOVA_TUNE_SET& a, const KOVA_TUNE_SET& b) {
     const auto f = [](const auto& x, const auto& y) { return std::memcmp(&x, &y, sizeof x) == 0; };
     return f(a.gain, b.gain) && f(a.pan, b.pan) && f(a.osc_enable, b.osc_enable) &&
            f(a.osc_depth, b.osc_depth) && f(a.sharp_enable, b.sharp_enable) &&
-           f(a.sharpness, b.sharpness) && f(a.wn_gain, b.wn_gain) &&
-           f(a.file_gain, b.file_gain) && f(a.start_gain, b.start_gain) &&
-           f(a.loop_gain, b.loop_gain) && f(a.end_gain, b.end_gain);
+           f(a.sharpness, b.sharpness) && f(a.wn_gain, b.wn_gain) && f(a.file_gain, b.file_gain) &&
+           f(a.start_gain, b.start_gain) && f(a.loop_gain, b.loop_gain) &&
+           f(a.end_gain, b.end_gain);
 }
 
-KOVA_FORMAT phone_format() { return KOVA_FORMAT{48000, 2, 1, 1080, 2280}; }
+KOVA_FORMAT phone_format() {
+    return KOVA_FORMAT{48000, 2, 1, 1080, 2280};
+}
 
 Engine::Engine() : Engine(phone_format()) {}
 
-Engine::Engine(const KOVA_FORMAT& f) : format_(f) { ctx_ = kova_init(&format_, &err_); }
+Engine::Engine(const KOVA_FORMAT& f) : format_(f) {
+    ctx_ = kova_init(&format_, &err_);
+}
 
 Engine::~Engine() {
     if (ctx_ != nullptr) FUZZ_CHECK(kova_deinit(ctx_) == KOVA_OK);

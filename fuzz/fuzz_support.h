@@ -14,9 +14,9 @@ namespace kova_fuzz {
 
 // A violated property: print what and where, then abort so the fuzzer records the input.
 [[noreturn]] void fail(const char* what, const char* file, int line);
-#define FUZZ_CHECK(cond)                                               \
-    do {                                                               \
-        if (!(cond)) ::kova_fuzz::fail(#cond, __FILE__, __LINE__);     \
+#define FUZZ_CHECK(cond)                                           \
+    do {                                                           \
+        if (!(cond)) ::kova_fuzz::fail(#cond, __FILE__, __LINE__); \
     } while (0)
 
 // Consumes the fuzz input front to back; past the end every read yields zeros.

@@ -138,8 +138,8 @@ void stroke(ScriptWriter& w, int moves, int16_t dx, int16_t dy, uint8_t dt, uint
     w.event(KOVA_ACTION_START, 0, 0, 40, sel);
     buffer_u32(w, sel, 960000);
     for (int i = 0; i < moves; ++i) {
-        w.event(KOVA_ACTION_MOVE, static_cast<int16_t>(dx + i % 3), static_cast<int16_t>(dy - i % 2),
-                static_cast<uint8_t>(dt + i % 4), sel);
+        w.event(KOVA_ACTION_MOVE, static_cast<int16_t>(dx + i % 3),
+                static_cast<int16_t>(dy - i % 2), static_cast<uint8_t>(dt + i % 4), sel);
         buffer_u32(w, sel, 960000);
     }
     w.event(KOVA_ACTION_END, 1, 1, dt, sel);
@@ -176,7 +176,12 @@ void generate_seeds() {
     }
     {
         ScriptWriter w;  // set management between strokes
-        w.header(7, false, true, 1080, 2280).u8(kova_fuzz::kSourceBoth).u16(800).u16(1000).u16(800).u8(90);
+        w.header(7, false, true, 1080, 2280)
+            .u8(kova_fuzz::kSourceBoth)
+            .u16(800)
+            .u16(1000)
+            .u16(800)
+            .u8(90);
         w.filter_record(KOVA_FLT_LOWPASS, 3000.0f, 1.0f, 1);
         stroke(w, 6, 10, 10, 16, kBuf3840);
         w.admin(kova_fuzz::kAdminSelect).u8(1);
