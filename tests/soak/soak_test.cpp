@@ -73,7 +73,7 @@ struct DeviceLog {
 };
 
 std::mutex g_devices_lock;
-std::vector<DeviceLog*> g_devices;  // in track creation order
+std::vector<std::unique_ptr<DeviceLog>> g_devices;  // in track creation order; outlive the tracks
 
 class LoggingSink final : public kova_host::AudioSink {
    public:
@@ -95,10 +95,9 @@ class LoggingSink final : public kova_host::AudioSink {
 };
 
 std::unique_ptr<kova_host::AudioSink> make_logging_sink(uint32_t, uint32_t) {
-    auto* log = new DeviceLog;  // lives until the end of the test binary
     std::lock_guard<std::mutex> guard(g_devices_lock);
-    g_devices.push_back(log);
-    return std::make_unique<LoggingSink>(log);
+    g_devices.push_back(std::make_unique<DeviceLog>());
+    return std::make_unique<LoggingSink>(g_devices.back().get());
 }
 
 long resident_bytes() {
@@ -319,7 +318,7 @@ TEST(Soak, InstancesStreamStrokesWithoutLossUnderrunOrGrowth) {
     const auto stop_at = t0 + std::chrono::seconds(soak_seconds());
     std::vector<std::unique_ptr<Producer>> producers;
     for (int i = 0; i < kInstances; ++i) {
-        producers.push_back(std::make_unique<Producer>(i, ids[i], g_devices[i], paths, t0));
+        producers.push_back(std::make_unique<Producer>(i, ids[i], g_devices[i].get(), paths, t0));
     }
     std::vector<std::thread> threads;
     for (auto& p : producers) threads.emplace_back([&p, stop_at] { p->run(stop_at); });
@@ -352,7 +351,7 @@ TEST(Soak, InstancesStreamStrokesWithoutLossUnderrunOrGrowth) {
 
     for (jlong id : ids) EXPECT_EQ(Java_com_corvane_audio_Kova_deinit(env, nullptr, id), 0);
     uint64_t silent = 0;
-    for (DeviceLog* d : g_devices) {
+    for (const auto& d : g_devices) {
         std::lock_guard<std::mutex> guard(d->lock);
         silent += d->silent_bursts;
     }
