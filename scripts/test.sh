@@ -10,7 +10,7 @@
 #   6. AArch64 cross build, its tests under qemu-user, and the source-set file exchange between
 #      x86-64 and AArch64 (scripts/aarch64.sh).
 # Environment: KOVA_JOBS (parallel jobs), KOVA_SOAK_SECONDS (default 20), KOVA_FUZZ_SECONDS
-# (per target, default 45), KOVA_SKIP (space-separated stage names to skip: valgrind soak tsan
+# (per target, default 60), KOVA_SKIP (space-separated stage names to skip: valgrind soak tsan
 # fuzz aarch64).
 set -euo pipefail
 root=$(cd "$(dirname "$0")/.." && pwd)
@@ -97,7 +97,7 @@ if ! skipped fuzz; then
         { tail -n 60 "$dir.build.log"; exit 1; }
     rm -rf "$dir/seeds"
     "$dir/fuzz/kova_fuzz_seeds" "$dir/seeds"
-    fuzz_seconds=${KOVA_FUZZ_SECONDS:-45}
+    fuzz_seconds=${KOVA_FUZZ_SECONDS:-60}
     # target:seed corpus:largest input to generate
     for spec in srcset_file:srcset:16384 file_queries:srcset:16384 pcm_load:pcm:8192 \
         generate:generate:4096; do
