@@ -99,9 +99,9 @@ if ! skipped fuzz; then
     "$dir/fuzz/kova_fuzz_seeds" "$dir/seeds"
     fuzz_seconds=${KOVA_FUZZ_SECONDS:-60}
     # target:seed corpus:largest input to generate
-    for spec in srcset_file:srcset:16384 file_queries:srcset:16384 pcm_load:pcm:8192 \
+    for entry in srcset_file:srcset:16384 file_queries:srcset:16384 pcm_load:pcm:8192 \
         generate:generate:4096; do
-        IFS=: read -r target seeds max_len <<<"$spec"
+        IFS=: read -r target seeds max_len <<<"$entry"
         bin=$dir/fuzz/kova_fuzz_$target
         work=$dir/corpus/$target
         artifacts=$dir/artifacts/$target
