@@ -361,19 +361,9 @@ TEST(Soak, InstancesStreamStrokesWithoutLossUnderrunOrGrowth) {
     EXPECT_EQ(allocs_after - allocs_before, g_register_allocs.load());
     // Resident memory may grow by the sets registered, plus slack for the allocator and the
     // test's own bookkeeping; a per-event or per-stroke leak would exceed it over a long run.
-    // Under a sanitizer the shadow memory and the allocator's quarantine grow with the run
-    // whatever the library does, so resident size says nothing there; the allocation count above
-    // still does.
-#if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
-    constexpr bool kResidentTellsLeaks = false;
-#else
-    constexpr bool kResidentTellsLeaks = true;
-#endif
     const long allowed = static_cast<long>(total.registrations) * kSetBytes + (24L << 20);
-    if (kResidentTellsLeaks) {
-        if (kResidentMeaningful) {
-            EXPECT_LE(resident_after - resident_before, allowed);
-        }
+    if (kResidentMeaningful) {
+        EXPECT_LE(resident_after - resident_before, allowed);
     }
 
     for (jlong id : ids) EXPECT_EQ(Java_com_corvane_audio_Kova_deinit(env, nullptr, id), 0);
