@@ -11,7 +11,7 @@
 #include "bench_files.h"
 #include "bench_registry.h"
 #include "kova/kova_engine.h"
-#include "kova/kova_registry.h"
+#include "kova/android/kova_registry.h"
 #include "summary.h"
 #include "util/kova_mem.h"
 

@@ -5,6 +5,7 @@
 #include "kova/kova_dsp.h"
 #include "util/kova_mem.h"
 #include "dsp/exact_math.h"
+#include "dsp/dsp_internal.h"
 
 namespace {
 

@@ -3,6 +3,7 @@
 #include <cstdint>
 #include <cstring>
 
+#include "dsp/dsp_internal.h"
 #include "kova/kova_dsp.h"
 
 namespace {

@@ -10,6 +10,9 @@
 #include "kova/kova_source.h"
 #include "kova/kova_types.h"
 
+/* Releases everything a context owns, then the context itself; tolerates a partly built one. */
+extern "C" void ctx_free(KOVA_CTX* ctx);
+
 /* A context is usable while it is non-null and carries its tag. */
 inline bool _ctx_alive(const KOVA_CTX* ctx) {
     return ctx != nullptr && ctx->tag == KOVA_CTX_TAG;

@@ -5,6 +5,7 @@
 
 #include "kova/kova_engine.h"
 #include "engine/generate_finish.h"
+#include "dsp/dsp_internal.h"
 
 namespace {
 

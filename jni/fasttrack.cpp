@@ -1,6 +1,6 @@
 /* Low-latency output stream: a fast AudioTrack whose callback drains a ring buffer that the
  * generating side fills with whole blocks. */
-#include "kova/kova_fasttrack.h"
+#include "kova/android/kova_fasttrack.h"
 
 #include <android/log.h>
 #include <media/AudioTrack.h>

@@ -7,7 +7,7 @@
 
 #include <mutex>
 
-#include "kova/kova_registry.h"
+#include "kova/android/kova_registry.h"
 
 #define KOVA_JNI_TAG "kova_jni"
 #define KOVA_JNI_LOG(...) __android_log_print(ANDROID_LOG_INFO, KOVA_JNI_TAG, __VA_ARGS__)

@@ -12,9 +12,6 @@ KOVA_API int32_t kova_osc_deinit(KOVA_OSC* osc);
 KOVA_API int32_t kova_osc_set_freq(KOVA_OSC* osc, double freq);
 KOVA_API double kova_osc_get_sample(KOVA_OSC* osc);
 KOVA_API int32_t kova_osc_gen_samples(KOVA_OSC* osc, int16_t* buf, int32_t bytes);
-/* Internal: the next `count` values of kova_osc_get_sample, leaving the oscillator as that many
- * calls would. */
-void _osc_fill(KOVA_OSC* osc, double* out, int64_t count);
 
 /* Thickness equaliser. */
 KOVA_API void kova_eq_init(KOVA_EQ* eq, int32_t low_hz, int32_t high_hz, int32_t sample_rate);
@@ -38,10 +35,6 @@ KOVA_API void kova_resample_s16_stereo(int32_t numerator, int32_t denominator,
                                        const KOVA_PCMBUF* in, KOVA_PCMBUF* out);
 KOVA_API int32_t calcDevide(int32_t a, int32_t b);
 KOVA_API int32_t calcMultiply(int32_t a, int32_t b);
-
-/* Internal: the resampler with an output capacity in bytes; never writes more than capacity. */
-void _resample_s16_stereo_capped(int32_t numerator, int32_t denominator, const KOVA_PCMBUF* in,
-                                 KOVA_PCMBUF* out, int32_t out_capacity);
 
 KOVA_EXTERN_C_END
 

@@ -11,7 +11,6 @@ KOVA_EXTERN_C_BEGIN
 KOVA_API int32_t kova_checkformat(const KOVA_FORMAT* f);
 KOVA_API KOVA_CTX* kova_init(const KOVA_FORMAT* f, int32_t* err);
 KOVA_API int32_t kova_deinit(KOVA_CTX* ctx);
-void ctx_free(KOVA_CTX* ctx); /* internal */
 
 /* Generation. */
 KOVA_API int32_t kova_gen_sounds(KOVA_CTX* ctx, const KOVA_PARAM* param, KOVA_PCMBUF* out);

@@ -7,6 +7,7 @@
 #include <cstring>
 #include <vector>
 
+#include "dsp/dsp_internal.h"
 #include "kova/kova_dsp.h"
 #include "util/kova_mem.h"
 

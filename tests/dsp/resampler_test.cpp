@@ -5,6 +5,7 @@
 #include <cstdlib>
 #include <vector>
 
+#include "dsp/dsp_internal.h"
 #include "kova/kova_dsp.h"
 
 namespace {

@@ -12,7 +12,7 @@
 #include <thread>
 #include <vector>
 
-#include "kova/kova_fasttrack.h"
+#include "kova/android/kova_fasttrack.h"
 #include "kova_host/audio_sink.h"
 
 namespace {

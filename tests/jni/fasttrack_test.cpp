@@ -1,4 +1,4 @@
-#include "kova/kova_fasttrack.h"
+#include "kova/android/kova_fasttrack.h"
 
 #include <android/log.h>
 #include <gtest/gtest.h>

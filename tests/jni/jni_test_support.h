@@ -19,7 +19,7 @@
 #include <vector>
 
 #include "kova/kova_engine.h"
-#include "kova/kova_registry.h"
+#include "kova/android/kova_registry.h"
 #include "support/log_capture.h"
 #include "util/kova_mem.h"
 

@@ -15,7 +15,7 @@
 
 #include "jni/jni_test_support.h"
 #include "kova/kova.h"
-#include "kova/kova_fasttrack.h"
+#include "kova/android/kova_fasttrack.h"
 #include "util/kova_mem.h"
 
 #if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)

@@ -30,7 +30,7 @@
 #include <vector>
 
 #include "jni/jni_test_support.h"
-#include "kova/kova_fasttrack.h"
+#include "kova/android/kova_fasttrack.h"
 #include "kova/kova_output.h"
 #include "kova_host/audio_sink.h"
 #include "util/kova_mem.h"

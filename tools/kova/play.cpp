@@ -1,4 +1,4 @@
-#include <kova/kova_fasttrack.h>
+#include <kova/android/kova_fasttrack.h>
 #include <kova/kova_output.h>
 #include <kova_host/audio_sink.h>
 #include <pthread.h>

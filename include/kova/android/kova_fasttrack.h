@@ -3,7 +3,7 @@
 #ifndef KOVA_FASTTRACK_H
 #define KOVA_FASTTRACK_H
 
-#include "kova_types.h"
+#include "../kova_types.h"
 
 /* After kova_types.h: this header uses uintptr_t without including <stdint.h>. */
 #include <utils/StrongPointer.h>

@@ -3,7 +3,7 @@
 #define KOVA_REGISTRY_H
 
 #include "kova_fasttrack.h"
-#include "kova_types.h"
+#include "../kova_types.h"
 
 #define KOVA_MAX_INSTANCES 20
 #define KOVA_INSTANCE_PCM_BYTES 960000
