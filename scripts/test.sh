@@ -8,10 +8,13 @@
 #   5. libFuzzer targets (clang): seed corpora made by the library, replay of seeds and saved
 #      regressions, then a bounded fuzzing run per target;
 #   6. AArch64 cross build, its tests under qemu-user, and the source-set file exchange between
-#      x86-64 and AArch64 (scripts/aarch64.sh).
+#      x86-64 and AArch64 (scripts/aarch64.sh);
+#   7. consumer: install into a temporary prefix, then find_package, pkg-config, the README's C
+#      snippet and add_subdirectory (scripts/consumer.sh);
+#   8. docs: the API reference (kova_docs: Doxygen, warnings are errors, every export named).
 # Environment: KOVA_JOBS (parallel jobs), KOVA_SOAK_SECONDS (default 20), KOVA_FUZZ_SECONDS
 # (per target, default 60), KOVA_SKIP (space-separated stage names to skip: valgrind soak tsan
-# fuzz aarch64).
+# fuzz aarch64 consumer docs).
 set -euo pipefail
 root=$(cd "$(dirname "$0")/.." && pwd)
 cd "$root"
@@ -41,6 +44,18 @@ run_suite() {
 
 run_suite build
 stage_done "plain build + ctest"
+
+if ! skipped consumer; then
+    scripts/consumer.sh build
+    stage_done "consumer: install, find_package, pkg-config, add_subdirectory"
+fi
+
+if ! skipped docs; then
+    echo "== docs: API reference"
+    cmake --build build --target kova_docs >build/docs.log 2>&1 || { tail -n 60 build/docs.log; exit 1; }
+    grep -E '^api docs:' build/docs.log
+    stage_done "docs: Doxygen API reference"
+fi
 
 if ! skipped valgrind; then
     echo "== valgrind: leak check over every allocation failure path"

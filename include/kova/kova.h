@@ -2,6 +2,7 @@
 #ifndef KOVA_H
 #define KOVA_H
 
+#include "kova_version.h"
 #include "kova_types.h"
 #include "kova_list.h"
 #include "kova_dsp.h"
