@@ -18,6 +18,7 @@ add_custom_command(
     COMMAND ${DOXYGEN_EXECUTABLE} ${KOVA_DOCS_OUT}/Doxyfile
     COMMAND ${PROJECT_SOURCE_DIR}/tools/check_api_docs.sh ${KOVA_DOCS_OUT}/xml/index.xml
             ${PROJECT_SOURCE_DIR}/tools/exports.txt
+            ${PROJECT_SOURCE_DIR}/java/src/com/corvane/audio/Kova.java
     DEPENDS ${KOVA_DOCS_INPUTS} ${KOVA_DOCS_OUT}/Doxyfile ${PROJECT_SOURCE_DIR}/tools/check_api_docs.sh
     WORKING_DIRECTORY ${PROJECT_SOURCE_DIR}
     COMMENT "API reference: Doxygen HTML in ${KOVA_DOCS_OUT}/html"

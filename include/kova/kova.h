@@ -1,4 +1,10 @@
-/* libKovaFastTrack: the whole C interface. */
+/**
+ * @file kova.h
+ * @brief The whole C interface of libKovaFastTrack: include this one header.
+ *
+ * The C++ platform-only parts (the fast-track output stream and the instance registry behind the
+ * Java class) are in kova/android/ and are not included here.
+ */
 #ifndef KOVA_H
 #define KOVA_H
 
