@@ -143,7 +143,8 @@ KOVA_API double _calc_distortion(double a, double b);
  * cut (::KOVA_SLOT_START_MAX_BYTES, ::KOVA_SLOT_LOOP_MAX_BYTES, ::KOVA_SLOT_END_MAX_BYTES).
  * @param ctx a live context holding fewer than ::KOVA_MAX_SRCSETS sets.
  * @param paths the start, loop and end files, each shorter than ::KOVA_PATH_BUF_BYTES; start and
- *          end may be null. The loop file is required. The strings are copied.
+ *          end may be null (a start or end file that cannot be loaded leaves its slot empty).
+ *          The loop file is required. The strings are copied.
  * @param[out] err receives ::KOVA_OK, ::KOVA_ERR_INVALID_PARAM (dead context),
  *          ::KOVA_ERR_SRC_FULL, ::KOVA_ERR_INSUFF_MEM, or ::KOVA_ERR_SOURCE when the loop sound
  *          could not be loaded.
@@ -192,14 +193,14 @@ KOVA_API int32_t kova_reg_src_bysavefile(KOVA_CTX* ctx, const char* path, int32_
 
 /**
  * Replaces a set's filter of the same type and re-filters all its sounds (file sounds are read
- * again from their files).
+ * again from their files; a file that cannot be read again leaves its slot empty).
  * @param ctx a live context.
  * @param index the set's identifier, 1 to kova_get_src_num().
  * @param dsc the new filter (copied); the set must already hold a filter of its `type`, which
  *          must be one of ::KOVA_FLT_LOWPASS, ::KOVA_FLT_HIGHPASS, ::KOVA_FLT_BANDPASS or
  *          ::KOVA_FLT_BANDREJECT.
- * @param[out] err receives ::KOVA_OK, ::KOVA_ERR_INVALID_PARAM, ::KOVA_ERR_INSUFF_MEM or
- *          ::KOVA_ERR_SOURCE.
+ * @param[out] err receives ::KOVA_OK, ::KOVA_ERR_INVALID_PARAM (also when the set has no
+ *          filter of that type) or ::KOVA_ERR_INSUFF_MEM.
  * @return `index`, or 0 on failure.
  */
 KOVA_API int32_t kova_update_filter(KOVA_CTX* ctx, int32_t index, const KOVA_FLT_DSC* dsc,
@@ -212,8 +213,7 @@ KOVA_API int32_t kova_update_filter(KOVA_CTX* ctx, int32_t index, const KOVA_FLT
  * @param index the set's identifier, 1 to kova_get_src_num().
  * @param dsc the filter (copied). Its `type` must be one of ::KOVA_FLT_LOWPASS,
  *          ::KOVA_FLT_HIGHPASS, ::KOVA_FLT_BANDPASS or ::KOVA_FLT_BANDREJECT.
- * @param[out] err receives ::KOVA_OK, ::KOVA_ERR_INVALID_PARAM, ::KOVA_ERR_INSUFF_MEM or
- *          ::KOVA_ERR_SOURCE.
+ * @param[out] err receives ::KOVA_OK, ::KOVA_ERR_INVALID_PARAM or ::KOVA_ERR_INSUFF_MEM.
  * @return `index`, or 0 on failure.
  */
 KOVA_API int32_t kova_attach_filter(KOVA_CTX* ctx, int32_t index, const KOVA_FLT_DSC* dsc,
@@ -231,15 +231,16 @@ KOVA_API int32_t kova_get_filters(KOVA_CTX* ctx, int32_t index,
                                   KOVA_FLT_DSC flt[KOVA_FLT_TYPE_COUNT]);
 
 /**
- * Replaces sounds of a set with raw PCM files (as kova_reg_src_byfiles() loads them) and
- * filters them with the set's filters; each replaced sound's repeat points return to the whole
- * sound.
+ * Replaces sounds of a set with raw PCM files (as kova_reg_src_byfiles() loads them; a file
+ * that cannot be loaded leaves its slot empty) and filters them with the set's filters; each
+ * replaced sound's repeat points return to the whole sound. On success the tune set's
+ * `file_gain` becomes 0.4 and `wn_gain` 0.0.
  * @param ctx a live context.
  * @param index the set's identifier, 1 to kova_get_src_num().
  * @param paths the start, loop and end files; a null entry keeps that slot.
- * @param[out] err receives ::KOVA_OK, ::KOVA_ERR_INVALID_PARAM, ::KOVA_ERR_INSUFF_MEM or
- *          ::KOVA_ERR_SOURCE (a file could not be loaded, or the set is missing).
- * @return `index`, or 0 on failure.
+ * @param[out] err receives ::KOVA_OK, ::KOVA_ERR_INVALID_PARAM, or ::KOVA_ERR_SOURCE when
+ *          the set is missing or has no loop sound afterwards.
+ * @return `index`, or 0 when refused or when the set has no loop sound afterwards.
  */
 KOVA_API int32_t kova_update_src_byfiles(KOVA_CTX* ctx, int32_t index,
                                          const char* const paths[KOVA_SLOT_COUNT], int32_t* err);
