@@ -37,3 +37,4 @@ configure_file(${PROJECT_SOURCE_DIR}/cmake/KovaFastTrack.pc.in
     ${PROJECT_BINARY_DIR}/KovaFastTrack.pc @ONLY)
 install(FILES ${PROJECT_BINARY_DIR}/KovaFastTrack.pc
     DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig)
+install(FILES ${PROJECT_SOURCE_DIR}/LICENSE DESTINATION ${CMAKE_INSTALL_DOCDIR})

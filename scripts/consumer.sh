@@ -27,6 +27,7 @@ if readelf -d "$lib" | grep -E 'R(UN)?PATH' | grep -qF "$build"; then
     echo "installed library has a run path into the build tree"; readelf -d "$lib" | grep PATH; exit 1
 fi
 [ -f "$prefix/share/java/kova.jar" ] || { echo "share/java/kova.jar missing"; exit 1; }
+[ -f "$prefix/share/doc/KovaFastTrack/LICENSE" ] || { echo "LICENSE not installed"; exit 1; }
 javap=${JAVA_HOME:+$JAVA_HOME/bin/}javap
 "$javap" -cp "$prefix/share/java/kova.jar" com.corvane.audio.Kova | grep -q 'native long init(' ||
     { echo "kova.jar lacks com.corvane.audio.Kova"; exit 1; }
@@ -66,4 +67,4 @@ cmake --build "$work/add_subdirectory" -j "$jobs" --target stroke >>"$work/as.lo
     { tail -n 60 "$work/as.log"; exit 1; }
 mkdir -p "$work/run-as"
 "$work/add_subdirectory/stroke" "$work/run-as"
-echo "== consumer: all four ways work"
+echo "== consumer: find_package, pkg-config, README snippet and add_subdirectory all pass"
