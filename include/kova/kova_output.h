@@ -88,8 +88,8 @@ KOVA_API uint32_t kova_ringbuffer_write(KOVA_RINGBUFFER* rb, const void* src, ui
  * library never writes; which device situation each row stands for is the application's choice.
  * @{ */
 
-#define KOVA_VOLUME_ROW 17              /**< Floats per row. */
-#define KOVA_VOLUME_DEVICE_VALUES 238   /**< Floats in a device table (14 rows). */
+#define KOVA_VOLUME_ROW 17               /**< Floats per row. */
+#define KOVA_VOLUME_DEVICE_VALUES 238    /**< Floats in a device table (14 rows). */
 #define KOVA_VOLUME_SITUATION_VALUES 289 /**< Floats in ::situationVolume (17 rows). */
 KOVA_API extern float spkVolume[KOVA_VOLUME_DEVICE_VALUES];       /**< Speaker curves. */
 KOVA_API extern float headsetVolume[KOVA_VOLUME_DEVICE_VALUES];   /**< Wired headset curves. */

@@ -38,9 +38,9 @@
 /** @name Error codes
  * Returned by value or stored through an `err` out-parameter.
  * @{ */
-#define KOVA_OK 0                   /**< Success. */
+#define KOVA_OK 0                    /**< Success. */
 #define KOVA_ERR_INVALID_FORMAT (-1) /**< kova_init() rejected the ::KOVA_FORMAT block. */
-#define KOVA_ERR_INSUFF_MEM (-2)    /**< An allocation failed; nothing was changed. */
+#define KOVA_ERR_INSUFF_MEM (-2)     /**< An allocation failed; nothing was changed. */
 /** A null or dead handle, an identifier out of range, a null or invalid argument, a missing
  * source set, or a file that could not be opened for reading. */
 #define KOVA_ERR_INVALID_PARAM (-3)
@@ -60,13 +60,13 @@
 
 /** @name Source slots and their maximum PCM length in bytes
  * @{ */
-#define KOVA_SLOT_START 0                /**< Slot of the start sound. */
-#define KOVA_SLOT_LOOP 1                 /**< Slot of the loop sound (required for a move). */
-#define KOVA_SLOT_END 2                  /**< Slot of the end sound. */
-#define KOVA_SLOT_COUNT 3                /**< Number of slots of a source set. */
-#define KOVA_SLOT_START_MAX_BYTES 38400  /**< Most bytes a start file contributes (0.2 s). */
-#define KOVA_SLOT_LOOP_MAX_BYTES 192000  /**< Most bytes a loop file contributes (1 s). */
-#define KOVA_SLOT_END_MAX_BYTES 38400    /**< Most bytes an end file contributes (0.2 s). */
+#define KOVA_SLOT_START 0               /**< Slot of the start sound. */
+#define KOVA_SLOT_LOOP 1                /**< Slot of the loop sound (required for a move). */
+#define KOVA_SLOT_END 2                 /**< Slot of the end sound. */
+#define KOVA_SLOT_COUNT 3               /**< Number of slots of a source set. */
+#define KOVA_SLOT_START_MAX_BYTES 38400 /**< Most bytes a start file contributes (0.2 s). */
+#define KOVA_SLOT_LOOP_MAX_BYTES 192000 /**< Most bytes a loop file contributes (1 s). */
+#define KOVA_SLOT_END_MAX_BYTES 38400   /**< Most bytes an end file contributes (0.2 s). */
 /** @} */
 
 /** @name Origins of a source's samples (KOVA_SRC::origin)
@@ -82,14 +82,14 @@
 #define KOVA_FLT_HIGHPASS 1u   /**< High-pass biquad. */
 #define KOVA_FLT_BANDPASS 2u   /**< Band-pass biquad. */
 #define KOVA_FLT_BANDREJECT 3u /**< Band-reject (notch) biquad. */
-#define KOVA_FLT_TYPE_COUNT 4  /**< Number of filter types; arrays indexed by type have this size. */
+#define KOVA_FLT_TYPE_COUNT 4  /**< Number of filter types: the size of arrays indexed by type. */
 /** @} */
 
 /** @name Handle tags
  * A live handle's first field holds its tag; a freed one holds 0.
  * @{ */
 #define KOVA_CTX_TAG 0x4B4F5641u /**< Tag of a live ::KOVA_CTX. */
-#define KOVA_FLT_TAG 0x4B4F5641u /**< Tag of a live ::KOVA_FLT (the same value as the context's). */
+#define KOVA_FLT_TAG 0x4B4F5641u /**< Tag of a live ::KOVA_FLT (the same as the context's). */
 #define KOVA_OSC_TAG 0x4B4F5653u /**< Tag of a live ::KOVA_OSC. */
 /** @} */
 
@@ -97,7 +97,7 @@
  * @{ */
 #define KOVA_MAX_SRCSETS 20          /**< Most source sets registered from files or by filter. */
 #define KOVA_MAX_SRCSETS_SAVEFILE 21 /**< A saved file may add a 21st set. */
-#define KOVA_WORK_BUF_BYTES 192000   /**< Size of a context's staging buffer (KOVA_CTX::work_buf). */
+#define KOVA_WORK_BUF_BYTES 192000   /**< Size of KOVA_CTX::work_buf, the staging buffer. */
 #define KOVA_PATH_BUF_BYTES 512      /**< Size of a path buffer; paths must be shorter. */
 /** @} */
 
@@ -166,17 +166,17 @@ typedef struct KOVA_FLT_DSC {
 /** The eleven values that map motion to sound, one record per source set. Every value is
  * taken by kova_set_tuneset() only when it lies in 0.0 to 1.0. Stored as an 88-byte record. */
 typedef struct KOVA_TUNE_SET {
-    double gain;          /**< Factor of every phase's gain, 0 to 1 (1.0 by default). */
-    double pan;           /**< Position panning depth, 0 to 1: left 1 - pan*x/w, right 1 - pan + pan*x/w. */
-    int32_t osc_enable;   /**< 1 = the oscillator modulates the loop sound; 0 = off. */
-    double osc_depth;     /**< Oscillator frequency = speed envelope * osc_depth * 200 Hz; 0 to 1. */
+    double gain; /**< Factor of every phase's gain, 0 to 1 (1.0 by default). */
+    double pan;  /**< Position panning depth, 0 to 1: left 1 - pan*x/w, right 1 - pan + pan*x/w. */
+    int32_t osc_enable; /**< 1 = the oscillator modulates the loop sound; 0 = off. */
+    double osc_depth;   /**< Oscillator frequency = speed envelope * osc_depth * 200 Hz; 0 to 1. */
     int32_t sharp_enable; /**< 1 = the loop sound's pitch rises with speed; 0 = off. */
-    double sharpness;     /**< Pitch ratio = max(1, 1 + (envelope - 1) * sharpness * 0.1); 0 to 1. */
-    double wn_gain;       /**< Level of a loop sound generated as noise, 0 to 1. */
-    double file_gain;     /**< Level of a loop sound loaded from a file, 0 to 1. */
-    double start_gain;    /**< Gain of the start sound, 0 to 1. */
-    double loop_gain;     /**< Gain of the loop sound, 0 to 1. */
-    double end_gain;      /**< Gain of the end sound, 0 to 1. */
+    double sharpness;  /**< Pitch ratio = max(1, 1 + (envelope - 1) * sharpness * 0.1); 0 to 1. */
+    double wn_gain;    /**< Level of a loop sound generated as noise, 0 to 1. */
+    double file_gain;  /**< Level of a loop sound loaded from a file, 0 to 1. */
+    double start_gain; /**< Gain of the start sound, 0 to 1. */
+    double loop_gain;  /**< Gain of the loop sound, 0 to 1. */
+    double end_gain;   /**< Gain of the end sound, 0 to 1. */
 } KOVA_TUNE_SET;
 
 /** One piece of PCM of a source set, owned by its set (released with kova_free_sourceobj()).
@@ -184,7 +184,8 @@ typedef struct KOVA_TUNE_SET {
 typedef struct KOVA_SRC {
     int16_t* pcm;      /**< The samples as loaded or generated (unfiltered), `size` bytes, owned. */
     int16_t* pcm_proc; /**< The samples after the set's filters, `size` bytes, owned; played. */
-    char* path;        /**< The PCM file (::KOVA_PATH_BUF_BYTES buffer), owned; null unless ::KOVA_ORIGIN_FILE. */
+    char* path;        /**< The PCM file (::KOVA_PATH_BUF_BYTES buffer), owned; null unless
+                          ::KOVA_ORIGIN_FILE. */
     int32_t size;      /**< Length of `pcm` and `pcm_proc` in bytes. */
     int32_t pos;       /**< Play position in 16-bit samples; 0 whenever `pcm_proc` is rebuilt. */
     int32_t slot;      /**< ::KOVA_SLOT_START, ::KOVA_SLOT_LOOP or ::KOVA_SLOT_END. */
@@ -199,7 +200,7 @@ typedef struct KOVA_SRCSET {
     KOVA_SRC* src[KOVA_SLOT_COUNT]; /**< The sounds by slot; null for an absent slot. */
     LIST* filters;                  /**< ::KOVA_FLT_DSC pointers, at most one per type; owned. */
     KOVA_TUNE_SET* tune;            /**< The set's tune set, owned. */
-    double thickness;               /**< Equaliser thickness, 0 (thin) to 1 (thick); 0.6 at registration. */
+    double thickness; /**< Equaliser thickness, 0 (thin) to 1 (thick); 0.6 at registration. */
 } KOVA_SRCSET;
 
 /** Which slots a source-set file holds and in which format. Exists only in source-set files
@@ -213,7 +214,7 @@ typedef struct KOVA_SRC_INFO {
 /** Repeat information of a source set, in milliseconds, per slot (indexed by ::KOVA_SLOT_START,
  * ::KOVA_SLOT_LOOP, ::KOVA_SLOT_END). */
 typedef struct KOVA_RPT_INFO {
-    int64_t len_ms[KOVA_SLOT_COUNT];       /**< Length of each sound; 0 for an absent slot. Read only. */
+    int64_t len_ms[KOVA_SLOT_COUNT]; /**< Length of each sound; 0 for an absent slot. Read only. */
     int32_t rpt_start_ms[KOVA_SLOT_COUNT]; /**< Where the repeat starts, from the sound's start. */
     int32_t rpt_end_ms[KOVA_SLOT_COUNT];   /**< Where the repeat ends, from the sound's start. */
 } KOVA_RPT_INFO;
@@ -223,15 +224,15 @@ typedef struct KOVA_RPT_INFO {
 /** An oscillator (kova_osc_init()); its fields are the oscillator's state, read but not written
  * by callers. */
 typedef struct KOVA_OSC {
-    uint32_t tag;         /**< ::KOVA_OSC_TAG while alive. */
-    void* self;           /**< The record's own address while alive. */
-    int32_t sample_rate;  /**< Sample rate in Hz. */
-    uint32_t channels;    /**< Channels; each value is repeated on every channel. */
-    double freq;          /**< Frequency in Hz; 10.0 at creation. */
-    uint32_t waveform;    /**< 1 square, 2 sawtooth, any other value sine. */
-    int64_t period;       /**< Samples per cycle: `sample_rate` / `freq`, truncated. */
-    int64_t phase;        /**< Position within the cycle, in samples. */
-    uint32_t hold;        /**< For 2 channels: 1 when the current value was handed out once. */
+    uint32_t tag;        /**< ::KOVA_OSC_TAG while alive. */
+    void* self;          /**< The record's own address while alive. */
+    int32_t sample_rate; /**< Sample rate in Hz. */
+    uint32_t channels;   /**< Channels; each value is repeated on every channel. */
+    double freq;         /**< Frequency in Hz; 10.0 at creation. */
+    uint32_t waveform;   /**< 1 square, 2 sawtooth, any other value sine. */
+    int64_t period;      /**< Samples per cycle: `sample_rate` / `freq`, truncated. */
+    int64_t phase;       /**< Position within the cycle, in samples. */
+    uint32_t hold;       /**< For 2 channels: 1 when the current value was handed out once. */
 } KOVA_OSC;
 
 /** The thickness equaliser: a three-band split with per-band gains (kova_eq_init()). Plain
@@ -266,10 +267,10 @@ typedef struct KOVA_BIQUAD {
 
 /** A filter context (kova_flt_init()): a descriptor copy and its biquad. */
 typedef struct KOVA_FLT {
-    uint32_t tag;         /**< ::KOVA_FLT_TAG while alive. */
-    void* self;           /**< The record's own address while alive. */
-    KOVA_FLT_DSC* dsc;    /**< Copy of the descriptor, owned. */
-    KOVA_BIQUAD* biquad;  /**< The biquad, owned. */
+    uint32_t tag;        /**< ::KOVA_FLT_TAG while alive. */
+    void* self;          /**< The record's own address while alive. */
+    KOVA_FLT_DSC* dsc;   /**< Copy of the descriptor, owned. */
+    KOVA_BIQUAD* biquad; /**< The biquad, owned. */
 } KOVA_FLT;
 
 /* ---- Engine context -------------------------------------------------------------------- */
@@ -277,22 +278,23 @@ typedef struct KOVA_FLT {
 /** The engine context (kova_init()), owned by its creator and freed with kova_deinit().
  * Callers treat it as opaque; the fields document the state it carries. */
 typedef struct KOVA_CTX {
-    uint32_t tag;            /**< ::KOVA_CTX_TAG while alive, 0 after kova_deinit(). */
-    int32_t active_src;      /**< 1-based identifier of the active set; 0 = none. */
-    uint32_t stroke;         /**< 1 while a stroke is in progress, 0 after an end. */
-    LIST* src_list;          /**< The registered ::KOVA_SRCSET pointers, owned; set n is element n-1. */
-    KOVA_FORMAT* format;     /**< Copy of the format block (`p` forced to 0 for 1 channel), owned. */
-    KOVA_PARAM* prev_param;  /**< The last start or move event, owned. */
-    int16_t* work_buf;       /**< Staging buffer of ::KOVA_WORK_BUF_BYTES, owned. */
-    pthread_mutex_t* mutex;  /**< Held by registration, filter updates, repeat information and saving. */
-    KOVA_OSC* osc;           /**< The oscillator, owned. */
-    double prev_env;         /**< Speed envelope of the previous move; 1.0 after a start. */
-    double norm;             /**< 10000 / sqrt(w*w + h*h): normalisation of the move energy. */
-    int32_t fast_count;      /**< Fast moves since the last loop reset. */
-    KOVA_EQ* eq;             /**< The thickness equaliser, owned. */
-    int16_t slew_odd;        /**< Slew limiter state of odd samples. */
-    int16_t slew_even;       /**< Slew limiter state of even samples. */
-    double volume;           /**< Output volume: 0.8 times the value given to kova_set_volume(). */
+    uint32_t tag;        /**< ::KOVA_CTX_TAG while alive, 0 after kova_deinit(). */
+    int32_t active_src;  /**< 1-based identifier of the active set; 0 = none. */
+    uint32_t stroke;     /**< 1 while a stroke is in progress, 0 after an end. */
+    LIST* src_list;      /**< The registered ::KOVA_SRCSET pointers, owned; set n is element n-1. */
+    KOVA_FORMAT* format; /**< Copy of the format block (`p` forced to 0 for 1 channel), owned. */
+    KOVA_PARAM* prev_param; /**< The last start or move event, owned. */
+    int16_t* work_buf;      /**< Staging buffer of ::KOVA_WORK_BUF_BYTES, owned. */
+    pthread_mutex_t*
+        mutex;          /**< Held by registration, filter updates, repeat information and saving. */
+    KOVA_OSC* osc;      /**< The oscillator, owned. */
+    double prev_env;    /**< Speed envelope of the previous move; 1.0 after a start. */
+    double norm;        /**< 10000 / sqrt(w*w + h*h): normalisation of the move energy. */
+    int32_t fast_count; /**< Fast moves since the last loop reset. */
+    KOVA_EQ* eq;        /**< The thickness equaliser, owned. */
+    int16_t slew_odd;   /**< Slew limiter state of odd samples. */
+    int16_t slew_even;  /**< Slew limiter state of even samples. */
+    double volume;      /**< Output volume: 0.8 times the value given to kova_set_volume(). */
 } KOVA_CTX;
 
 /* ---- File access layer ------------------------------------------------------------------ */
@@ -303,13 +305,15 @@ typedef struct TARQ_MFAL {
     /** Opens `path`: mode bit 0 set = read-write, created with mode 0644 if missing, not
      * truncated; clear = read-only. Returns a handle, or null. */
     void* (*open)(struct TARQ_MFAL* m, int mode);
-    void (*close)(void* h);                      /**< Closes the file and frees the handle. */
-    int (*read)(void* h, void* buf, int len);    /**< One read: bytes read, 0 at the end, -1 on error. */
+    void (*close)(void* h); /**< Closes the file and frees the handle. */
+    int (*read)(void* h, void* buf,
+                int len); /**< One read: bytes read, 0 at the end, -1 on error. */
     int (*write)(void* h, const void* buf, int len); /**< One write: bytes written, or -1. */
-    int (*getpos)(void* h, int64_t* pos);        /**< Stores the current offset; 0, or -1. */
-    int (*setpos)(void* h, const int64_t* pos);  /**< Seeks to an absolute offset; 0, or -1. */
-    int (*skip)(void* h, const int64_t* count);  /**< Moves forward by count (at least 1); 0, or -1. */
-    int (*getsize)(void* h, int64_t* size);      /**< Stores the file size in bytes; 0, or -1. */
+    int (*getpos)(void* h, int64_t* pos);            /**< Stores the current offset; 0, or -1. */
+    int (*setpos)(void* h, const int64_t* pos);      /**< Seeks to an absolute offset; 0, or -1. */
+    int (*skip)(void* h,
+                const int64_t* count);      /**< Moves forward by count (at least 1); 0, or -1. */
+    int (*getsize)(void* h, int64_t* size); /**< Stores the file size in bytes; 0, or -1. */
     char* path; /**< The path, a ::KOVA_PATH_BUF_BYTES buffer owned (and freed) by the user. */
 } TARQ_MFAL;
 
@@ -320,7 +324,8 @@ typedef struct TARQ_MFAL {
 typedef struct KOVA_RINGBUFFER {
     uint8_t* buf;      /**< The storage, `size` bytes, owned. */
     uint32_t writeIdx; /**< Index of the next byte to write, below `size`. */
-    uint32_t readIdx;  /**< Index of the next byte to read, below `size`; equal to `writeIdx` when empty. */
+    uint32_t readIdx;  /**< Index of the next byte to read, below `size`; equal to `writeIdx` when
+                          empty. */
     uint32_t size;     /**< Storage size in bytes, a power of two, at least 2. */
     uint32_t mask;     /**< `size` - 1. */
 } KOVA_RINGBUFFER;

@@ -40,10 +40,10 @@ class AudioTrack;
  */
 struct KOVA_FASTTRACK {
     android::sp<android::AudioTrack> track; /**< The platform track; null once closed. */
-    void* pBuffer; /**< The `android::AudioTrack::Buffer*` of the most recent callback. */
-    KOVA_RINGBUFFER* pRing; /**< The queue, owned: 384000 requested, 524288 of storage. */
-    uint32_t lastCopied;    /**< Bytes handed to the device by the most recent callback. */
-    uint32_t lastAvail;     /**< Bytes the queue held at the most recent callback. */
+    void* pBuffer;           /**< The `android::AudioTrack::Buffer*` of the most recent callback. */
+    KOVA_RINGBUFFER* pRing;  /**< The queue, owned: 384000 requested, 524288 of storage. */
+    uint32_t lastCopied;     /**< Bytes handed to the device by the most recent callback. */
+    uint32_t lastAvail;      /**< Bytes the queue held at the most recent callback. */
     pthread_mutex_t* pMutex; /**< The stream's mutex, owned; null when it could not be made. */
     /** 1 playing, 0 stopped. Read by the callback without the lock, so accessed atomically. */
     int32_t state;

@@ -23,8 +23,8 @@
 #include "kova_fasttrack.h"
 #include "../kova_types.h"
 
-#define KOVA_MAX_INSTANCES 20           /**< Registry slots: instances one process may hold. */
-#define KOVA_INSTANCE_PCM_BYTES 960000  /**< Size of an instance's PCM buffer. */
+#define KOVA_MAX_INSTANCES 20          /**< Registry slots: instances one process may hold. */
+#define KOVA_INSTANCE_PCM_BYTES 960000 /**< Size of an instance's PCM buffer. */
 
 /** One instance, owned by its registry slot. */
 struct KovaInstance {
@@ -37,9 +37,9 @@ struct KovaInstance {
 
 /** One registry slot. */
 struct KovaInfo {
-    int32_t pid;              /**< Process id of the `init` caller; -1 when free. */
-    KovaInstance* pInstance;  /**< The instance; null when free. */
-    int32_t isUsed;           /**< 1 in use, 0 free. */
+    int32_t pid;             /**< Process id of the `init` caller; -1 when free. */
+    KovaInstance* pInstance; /**< The instance; null when free. */
+    int32_t isUsed;          /**< 1 in use, 0 free. */
 };
 
 extern "C" {
