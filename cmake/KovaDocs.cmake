@@ -2,7 +2,7 @@
 # and docs/api/mainpage.md, with the event-path diagram drawn by graphviz from docs/event-path.dot.
 # Any Doxygen warning fails the target, and so does an exported function missing from the index.
 find_package(Doxygen COMPONENTS dot)
-if(NOT DOXYGEN_FOUND OR NOT DOXYGEN_DOT_FOUND)
+if(NOT DOXYGEN_FOUND OR NOT TARGET Doxygen::dot)
     # A machine without doxygen and graphviz (before scripts/setup.sh) still builds the library.
     message(STATUS "kova_docs not available: doxygen and graphviz (dot) are needed")
     return()
