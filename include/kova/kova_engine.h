@@ -34,10 +34,10 @@ KOVA_EXTERN_C_BEGIN
 
 /**
  * Checks a format block.
- * @param f the format block. This must not be null. Its `sample_rate` must be from 8000 to 48000
- *          and its `channels` 1 or 2; when `p` is 1, `channels` must be 2 and `w` and `h`
- *          non-zero (`w` and `h` are not checked otherwise).
- * @return 1 when the block is usable, -1 when not.
+ * @param f the format block. Its `sample_rate` must be from 8000 to 48000 and its `channels`
+ *          1 or 2; when `p` is 1, `channels` must be 2 and `w` and `h` non-zero (`w` and `h` are
+ *          not checked otherwise).
+ * @return 1 when the block is usable, -1 when not (also for a null block).
  */
 KOVA_API int32_t kova_checkformat(const KOVA_FORMAT* f);
 
@@ -182,7 +182,7 @@ KOVA_API int32_t kova_reg_src_byfilter(KOVA_CTX* ctx, const KOVA_FLT_DSC* dsc, i
 
 /**
  * Registers the set saved in a source-set file by kova_save_source(). The file is untrusted
- * input: a damaged file is refused, never read beyond its records.
+ * input, read as kova_open_source() does.
  * @param ctx a live context holding fewer than ::KOVA_MAX_SRCSETS_SAVEFILE sets.
  * @param path the file, shorter than ::KOVA_PATH_BUF_BYTES. This must not be null.
  * @param[out] err receives ::KOVA_OK, ::KOVA_ERR_INVALID_PARAM (dead context, null path, file

@@ -192,8 +192,10 @@ KOVA_API int _write_KOVA_SRC(void* h, TARQ_MFAL* mfal, const KOVA_SRC* src);
 
 /**
  * Reads a sound: its 48-byte record and its samples, into a new sound whose `pcm` and
- * `pcm_proc` both hold the samples (origin ::KOVA_ORIGIN_SAVEFILE). Allocates. A record whose
- * size or repeat points are out of range, or a file that ends early, gives null.
+ * `pcm_proc` both hold the samples (origin ::KOVA_ORIGIN_SAVEFILE). Allocates at most
+ * ::KOVA_SLOT_LOOP_MAX_BYTES twice. A longer payload is cut at that limit (the rest is skipped)
+ * and one cut short by the end of the file is kept as far as it was read; a record cut by the
+ * end of the file, or with a size of 0 or less, gives null.
  * @param h the handle.
  * @param mfal the access object.
  * @return the sound, owned by the caller (free it with kova_free_sourceobj()); null on failure.
@@ -220,7 +222,8 @@ KOVA_API int kova_write_srcset(int sample_rate, int channels, KOVA_SRCSET* set, 
 
 /**
  * Reads a source-set file into a prepared set and filters its sounds with the filters read.
- * Allocates and reads the file. The file is untrusted: damaged records are refused.
+ * Allocates and reads the file. The file is untrusted input: it is never read beyond its
+ * records, and records that cannot be used are left out or make the call fail.
  * @param set the set: `filters` an empty list, `tune` an allocated record (overwritten), the
  *          three `src` null.
  * @param path the file, shorter than ::KOVA_PATH_BUF_BYTES.
