@@ -1,0 +1,206 @@
+// The sample kernel of every action: two passes per chunk. The first has no dependency from one
+// sample to the next (gain, envelope, oscillator, panning, truncation, normalisation) and is
+// written so the compiler vectorises it; the second is the serial part (equaliser, clipping,
+// slew limiter). Kept apart, the serial pass carries little besides the equaliser's own chain.
+#include <cstdint>
+
+#include "kova/kova_dsp.h"
+#include "engine/generate_finish.h"
+
+namespace kova_gen {
+namespace {
+
+// Samples per chunk: even, so the parities of every chunk line up with the whole block, and
+// small enough for the buffers to stay in the first-level cache.
+constexpr int64_t kChunk = 256;
+
+// trunc32 without branches, then the equaliser's normalisation: the first pass stays a
+// straight line the compiler can vectorise. Saturates like trunc_sat32, NaN gives 0.
+inline double eq_input(double v) {
+    v = v >= 2147483647.0 ? 2147483647.0 : v;
+    v = v <= -2147483648.0 ? -2147483648.0 : v;
+    v = v == v ? v : 0.0;
+    return static_cast<double>(static_cast<int32_t>(v)) / 2147483647.0;
+}
+
+// What follows the equaliser and the clipper: nothing (pitch-raise staging), the slew limiter
+// (plain moves), or the pan gain applied to the finished sample (start and end sounds).
+enum class Post { none, slew, pan };
+
+struct PostState {
+    double pan_gain[2];
+    double decay;
+    int16_t mem[2];  // slew memories, even and odd
+};
+
+template <Post kPost>
+[[gnu::always_inline]] inline int16_t post(int16_t d, double pan, double decay, int16_t& memory) {
+    if (kPost == Post::slew) {
+        // |m - d| >= limit moves d to m -/+ limit: the same as clamping d into
+        // [m - limit, m + limit], which compiles to conditional moves.
+        constexpr int32_t kSlewLimit = 1000;
+        const int32_t m = memory;
+        int32_t v = d;
+        v = v < m - kSlewLimit ? m - kSlewLimit : v;
+        v = v > m + kSlewLimit ? m + kSlewLimit : v;
+        d = static_cast<int16_t>(v);
+        // |d * decay| <= 32768: the conversion is always defined.
+        memory = static_cast<int16_t>(static_cast<int32_t>(d * decay));
+    } else if (kPost == Post::pan) {
+        d = static_cast<int16_t>(kova::dsp::trunc_sat32(d * pan));
+    }
+    return d;
+}
+
+// Second pass over one chunk of normalised inputs. Alongside, it advances the envelope factor
+// for the next chunk (c, one value per pair written to both samples): that chain is serial
+// too, and here it runs in the shadow of the equaliser's.
+template <Post kPost>
+void serial_pass(EqKernel& eq, const double* x, int64_t len, int16_t* dst, PostState& ps,
+                 double* env, double& c, double step) {
+    const double pan_even = ps.pan_gain[0];
+    const double pan_odd = ps.pan_gain[1];
+    const double decay = ps.decay;
+    int16_t mem_even = ps.mem[0];
+    int16_t mem_odd = ps.mem[1];
+    int64_t i = 0;
+    for (; i + 1 < len; i += 2) {
+        c = c + step;
+        env[i] = c;
+        env[i + 1] = c;
+        dst[i] = post<kPost>(finish_input(eq, x[i]), pan_even, decay, mem_even);
+        dst[i + 1] = post<kPost>(finish_input(eq, x[i + 1]), pan_odd, decay, mem_odd);
+    }
+    if (i < len) dst[i] = post<kPost>(finish_input(eq, x[i]), pan_even, decay, mem_even);
+    ps.mem[0] = mem_even;
+    ps.mem[1] = mem_odd;
+}
+
+// Loop samples from the play position, wrapping at the loop end, as doubles.
+void gather(LoopRender& r, double* x, int64_t len) {
+    int64_t i = 0;
+    while (i < len) {
+        // A position at or past the end plays one sample and wraps.
+        int64_t seg = r.loop_end - r.pos;
+        if (seg < 1) seg = 1;
+        if (seg > len - i) seg = len - i;
+        const int16_t* src = r.pcm + r.pos;
+        for (int64_t j = 0; j < seg; ++j) x[i + j] = src[j];
+        i += seg;
+        r.pos = static_cast<int32_t>(r.pos + seg);
+        if (r.pos >= r.loop_end) r.pos = r.restart;
+    }
+}
+
+// First pass of a move: gain x sample x envelope x oscillator x pan, in that order (factors
+// that are 1.0 are left out, which changes no bit), then truncation and normalisation.
+template <bool kOsc, bool kPan>
+void parallel_pass(const LoopRender& r, double* x, const double* env, const double* o,
+                   int64_t len) {
+    const double gain = r.gain;
+    const double pan_even = r.pan_gain[0];
+    const double pan_odd = r.pan_gain[1];
+    const int64_t pairs = len / 2;
+    for (int64_t k = 0; k < pairs; ++k) {
+        double v0 = gain * x[2 * k] * env[2 * k];
+        double v1 = gain * x[2 * k + 1] * env[2 * k + 1];
+        if (kOsc) {
+            v0 = v0 * o[2 * k];
+            v1 = v1 * o[2 * k + 1];
+        }
+        if (kPan) {
+            v0 = v0 * pan_even;
+            v1 = v1 * pan_odd;
+        }
+        x[2 * k] = eq_input(v0);
+        x[2 * k + 1] = eq_input(v1);
+    }
+    if (len & 1) {
+        const int64_t i = len - 1;
+        double v = gain * x[i] * env[i];
+        if (kOsc) v = v * o[i];
+        if (kPan) v = v * pan_even;
+        x[i] = eq_input(v);
+    }
+}
+
+template <bool kOsc, bool kPan, Post kPost>
+void loop_blocks(KOVA_EQ* keq, LoopRender& r, int16_t* dst, int64_t count) {
+    EqKernel eq(keq);
+    alignas(16) double x[kChunk];
+    alignas(16) double env[kChunk];
+    alignas(16) double o[kChunk];
+    PostState ps{{r.pan_gain[0], r.pan_gain[1]}, r.decay, {r.mem_even, r.mem_odd}};
+    double c = r.c;
+    // The first chunk's envelope; every later one comes out of the serial pass before it.
+    const int64_t first = count < kChunk ? count : kChunk;
+    for (int64_t i = 0; i < first; i += 2) {
+        c = c + r.step;
+        env[i] = c;
+        env[i + 1] = c;
+    }
+    for (int64_t done = 0; done < count; done += kChunk) {
+        const int64_t len = (count - done < kChunk) ? count - done : kChunk;
+        gather(r, x, len);
+        if (kOsc) _osc_fill(r.osc, o, len);
+        parallel_pass<kOsc, kPan>(r, x, env, o, len);
+        serial_pass<kPost>(eq, x, len, dst + done, ps, env, c, r.step);
+    }
+    r.mem_even = ps.mem[0];
+    r.mem_odd = ps.mem[1];
+}
+
+template <Post kPost>
+void loop_blocks_by_factors(KOVA_EQ* eq, LoopRender& r, int16_t* dst, int64_t count) {
+    const bool osc = r.osc != nullptr;
+    const bool pan = !(r.pan_gain[0] == 1.0 && r.pan_gain[1] == 1.0);
+    if (osc && pan) {
+        loop_blocks<true, true, kPost>(eq, r, dst, count);
+    } else if (osc) {
+        loop_blocks<true, false, kPost>(eq, r, dst, count);
+    } else if (pan) {
+        loop_blocks<false, true, kPost>(eq, r, dst, count);
+    } else {
+        loop_blocks<false, false, kPost>(eq, r, dst, count);
+    }
+}
+
+template <Post kPost>
+void once_blocks(KOVA_EQ* keq, const int16_t* pcm, int64_t count, double gain,
+                 const double pan_gain[2], int16_t* dst) {
+    EqKernel eq(keq);
+    alignas(16) double x[kChunk];
+    alignas(16) double unused_env[kChunk];
+    double unused_c = 0.0;
+    PostState ps{{pan_gain[0], pan_gain[1]}, 1.0, {0, 0}};
+    for (int64_t done = 0; done < count; done += kChunk) {
+        const int64_t len = (count - done < kChunk) ? count - done : kChunk;
+        const int16_t* src = pcm + done;
+        for (int64_t i = 0; i < len; ++i) x[i] = eq_input(gain * src[i]);
+        serial_pass<kPost>(eq, x, len, dst + done, ps, unused_env, unused_c, 0.0);
+    }
+}
+
+}  // namespace
+
+void render_loop(KOVA_EQ* eq, LoopRender& r, int16_t* dst, int64_t count) {
+    if (count < 1) return;
+    if (r.slew) {
+        loop_blocks_by_factors<Post::slew>(eq, r, dst, count);
+    } else {
+        loop_blocks_by_factors<Post::none>(eq, r, dst, count);
+    }
+}
+
+void render_once(KOVA_EQ* eq, const int16_t* pcm, int64_t count, double gain,
+                 const double pan_gain[2], int16_t* dst) {
+    if (count < 1) return;
+    // The pan gain multiplies the finished sample; a gain of 1.0 keeps it as it is.
+    if (pan_gain[0] == 1.0 && pan_gain[1] == 1.0) {
+        once_blocks<Post::none>(eq, pcm, count, gain, pan_gain, dst);
+    } else {
+        once_blocks<Post::pan>(eq, pcm, count, gain, pan_gain, dst);
+    }
+}
+
+}  // namespace kova_gen
