@@ -14,13 +14,19 @@ namespace {
 // small enough for the buffers to stay in the first-level cache.
 constexpr int64_t kChunk = 256;
 
-// trunc32 without branches, then the equaliser's normalisation: the first pass stays a
-// straight line the compiler can vectorise. Saturates like trunc_sat32, NaN gives 0.
+// trunc32 without branches, so the first pass stays a straight line the compiler can
+// vectorise; the integer comes back as a double. Saturates like trunc_sat32, NaN gives 0.
 inline double eq_input(double v) {
     v = v >= 2147483647.0 ? 2147483647.0 : v;
     v = v <= -2147483648.0 ? -2147483648.0 : v;
     v = v == v ? v : 0.0;
-    return static_cast<double>(static_cast<int32_t>(v)) / 2147483647.0;
+    return static_cast<double>(static_cast<int32_t>(v));
+}
+
+// The equaliser's normalisation. Done in the serial pass, where the divider works beside the
+// equaliser's chain instead of holding up the first pass.
+inline double normalised(double sample) {
+    return sample / 2147483647.0;
 }
 
 // What follows the equaliser and the clipper: nothing (pitch-raise staging), the slew limiter
@@ -52,12 +58,15 @@ template <Post kPost>
     return d;
 }
 
-// Second pass over one chunk of normalised inputs. Alongside, it advances the envelope factor
+// Second pass over one chunk of truncated inputs. Alongside, it advances the envelope factor
 // for the next chunk (c, one value per pair written to both samples): that chain is serial
-// too, and here it runs in the shadow of the equaliser's.
+// too, and here it runs in the shadow of the equaliser's. The equaliser state is loaded into a
+// local kernel per chunk: held in an object the caller can see, it would go through memory on
+// every sample (the envelope stores might alias it), adding a store and a load to the chain.
 template <Post kPost>
-void serial_pass(EqKernel& eq, const double* x, int64_t len, int16_t* dst, PostState& ps,
+void serial_pass(KOVA_EQ* keq, const double* x, int64_t len, int16_t* dst, PostState& ps,
                  double* env, double& c, double step) {
+    EqKernel eq(keq);
     const double pan_even = ps.pan_gain[0];
     const double pan_odd = ps.pan_gain[1];
     const double decay = ps.decay;
@@ -68,10 +77,10 @@ void serial_pass(EqKernel& eq, const double* x, int64_t len, int16_t* dst, PostS
         c = c + step;
         env[i] = c;
         env[i + 1] = c;
-        dst[i] = post<kPost>(finish_input(eq, x[i]), pan_even, decay, mem_even);
-        dst[i + 1] = post<kPost>(finish_input(eq, x[i + 1]), pan_odd, decay, mem_odd);
+        dst[i] = post<kPost>(finish_input(eq, normalised(x[i])), pan_even, decay, mem_even);
+        dst[i + 1] = post<kPost>(finish_input(eq, normalised(x[i + 1])), pan_odd, decay, mem_odd);
     }
-    if (i < len) dst[i] = post<kPost>(finish_input(eq, x[i]), pan_even, decay, mem_even);
+    if (i < len) dst[i] = post<kPost>(finish_input(eq, normalised(x[i])), pan_even, decay, mem_even);
     ps.mem[0] = mem_even;
     ps.mem[1] = mem_odd;
 }
@@ -125,8 +134,7 @@ void parallel_pass(const LoopRender& r, double* x, const double* env, const doub
 }
 
 template <bool kOsc, bool kPan, Post kPost>
-void loop_blocks(KOVA_EQ* keq, LoopRender& r, int16_t* dst, int64_t count) {
-    EqKernel eq(keq);
+void loop_blocks(KOVA_EQ* eq, LoopRender& r, int16_t* dst, int64_t count) {
     alignas(16) double x[kChunk];
     alignas(16) double env[kChunk];
     alignas(16) double o[kChunk];
@@ -166,9 +174,8 @@ void loop_blocks_by_factors(KOVA_EQ* eq, LoopRender& r, int16_t* dst, int64_t co
 }
 
 template <Post kPost>
-void once_blocks(KOVA_EQ* keq, const int16_t* pcm, int64_t count, double gain,
+void once_blocks(KOVA_EQ* eq, const int16_t* pcm, int64_t count, double gain,
                  const double pan_gain[2], int16_t* dst) {
-    EqKernel eq(keq);
     alignas(16) double x[kChunk];
     alignas(16) double unused_env[kChunk];
     double unused_c = 0.0;
