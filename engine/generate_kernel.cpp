@@ -15,11 +15,12 @@ namespace {
 constexpr int64_t kChunk = 256;
 
 // trunc32 without branches, so the first pass stays a straight line the compiler can
-// vectorise; the integer comes back as a double. Saturates like trunc_sat32, NaN gives 0.
+// vectorise; the integer comes back as a double. Saturates like trunc_sat32, NaN gives 0. Each
+// select is written in the form of a minimum, maximum or mask instruction.
 inline double eq_input(double v) {
-    v = v >= 2147483647.0 ? 2147483647.0 : v;
-    v = v <= -2147483648.0 ? -2147483648.0 : v;
     v = v == v ? v : 0.0;
+    v = v < 2147483647.0 ? v : 2147483647.0;
+    v = v > -2147483648.0 ? v : -2147483648.0;
     return static_cast<double>(static_cast<int32_t>(v));
 }
 
@@ -85,51 +86,60 @@ void serial_pass(KOVA_EQ* keq, const double* x, int64_t len, int16_t* dst, PostS
     ps.mem[1] = mem_odd;
 }
 
-// Loop samples from the play position, wrapping at the loop end, as doubles.
-void gather(LoopRender& r, double* x, int64_t len) {
+// First pass of a move over `len` samples of one stretch of the loop (no wrap inside): gain x
+// sample x envelope x oscillator x pan, in that order (factors that are 1.0 are left out, which
+// changes no bit), then truncation. `first` is the parity of the stretch's first sample.
+template <bool kOsc, bool kPan>
+void products(const int16_t* src, double gain, const double pan_gain[2], const double* env,
+              const double* o, double* x, int64_t len, int64_t first) {
+    if (!kPan) {
+        for (int64_t i = 0; i < len; ++i) {
+            double v = gain * src[i] * env[i];
+            if (kOsc) v = v * o[i];
+            x[i] = eq_input(v);
+        }
+        return;
+    }
+    // With panning, the pair loop keeps each parity's gain in its own lane.
+    int64_t i = 0;
+    if (first & 1) {
+        double v = gain * src[0] * env[0];
+        if (kOsc) v = v * o[0];
+        x[0] = eq_input(v * pan_gain[1]);
+        i = 1;
+    }
+    const double pan_even = pan_gain[0];
+    const double pan_odd = pan_gain[1];
+    for (; i + 1 < len; i += 2) {
+        double v0 = gain * src[i] * env[i];
+        double v1 = gain * src[i + 1] * env[i + 1];
+        if (kOsc) {
+            v0 = v0 * o[i];
+            v1 = v1 * o[i + 1];
+        }
+        x[i] = eq_input(v0 * pan_even);
+        x[i + 1] = eq_input(v1 * pan_odd);
+    }
+    if (i < len) {
+        double v = gain * src[i] * env[i];
+        if (kOsc) v = v * o[i];
+        x[i] = eq_input(v * pan_even);
+    }
+}
+
+// The first pass over a chunk, stretch by stretch of the loop, wrapping at the loop end.
+template <bool kOsc, bool kPan>
+void loop_products(LoopRender& r, const double* env, const double* o, double* x, int64_t len) {
     int64_t i = 0;
     while (i < len) {
         // A position at or past the end plays one sample and wraps.
         int64_t seg = r.loop_end - r.pos;
         if (seg < 1) seg = 1;
         if (seg > len - i) seg = len - i;
-        const int16_t* src = r.pcm + r.pos;
-        for (int64_t j = 0; j < seg; ++j) x[i + j] = src[j];
+        products<kOsc, kPan>(r.pcm + r.pos, r.gain, r.pan_gain, env + i, o + i, x + i, seg, i);
         i += seg;
         r.pos = static_cast<int32_t>(r.pos + seg);
         if (r.pos >= r.loop_end) r.pos = r.restart;
-    }
-}
-
-// First pass of a move: gain x sample x envelope x oscillator x pan, in that order (factors
-// that are 1.0 are left out, which changes no bit), then truncation and normalisation.
-template <bool kOsc, bool kPan>
-void parallel_pass(const LoopRender& r, double* x, const double* env, const double* o,
-                   int64_t len) {
-    const double gain = r.gain;
-    const double pan_even = r.pan_gain[0];
-    const double pan_odd = r.pan_gain[1];
-    const int64_t pairs = len / 2;
-    for (int64_t k = 0; k < pairs; ++k) {
-        double v0 = gain * x[2 * k] * env[2 * k];
-        double v1 = gain * x[2 * k + 1] * env[2 * k + 1];
-        if (kOsc) {
-            v0 = v0 * o[2 * k];
-            v1 = v1 * o[2 * k + 1];
-        }
-        if (kPan) {
-            v0 = v0 * pan_even;
-            v1 = v1 * pan_odd;
-        }
-        x[2 * k] = eq_input(v0);
-        x[2 * k + 1] = eq_input(v1);
-    }
-    if (len & 1) {
-        const int64_t i = len - 1;
-        double v = gain * x[i] * env[i];
-        if (kOsc) v = v * o[i];
-        if (kPan) v = v * pan_even;
-        x[i] = eq_input(v);
     }
 }
 
@@ -149,9 +159,8 @@ void loop_blocks(KOVA_EQ* eq, LoopRender& r, int16_t* dst, int64_t count) {
     }
     for (int64_t done = 0; done < count; done += kChunk) {
         const int64_t len = (count - done < kChunk) ? count - done : kChunk;
-        gather(r, x, len);
         if (kOsc) _osc_fill(r.osc, o, len);
-        parallel_pass<kOsc, kPan>(r, x, env, o, len);
+        loop_products<kOsc, kPan>(r, env, o, x, len);
         serial_pass<kPost>(eq, x, len, dst + done, ps, env, c, r.step);
     }
     r.mem_even = ps.mem[0];
