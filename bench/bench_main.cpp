@@ -16,6 +16,7 @@ int main(int argc, char** argv) {
     kova_bench::register_ringbuffer_benchmarks();
     kova_bench::register_generate_benchmarks();
     kova_bench::report_memory();
+    kova_bench::report_registry_wait();
     std::cout << kova_bench::preamble_text() << std::endl;
 
     kova_bench::CollectingReporter reporter;

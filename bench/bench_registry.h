@@ -9,6 +9,9 @@ void register_ringbuffer_benchmarks();
 void register_generate_benchmarks();
 // Not timed: heap figures per instance, written into the preamble.
 void report_memory();
+// Not timed by the framework: strokes of 20 instances starting at once, waits on the registry
+// lock, written into the preamble.
+void report_registry_wait();
 
 }  // namespace kova_bench
 

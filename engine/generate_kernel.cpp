@@ -30,18 +30,17 @@ inline double normalised(double sample) {
     return sample / 2147483647.0;
 }
 
-// What follows the equaliser and the clipper: nothing (pitch-raise staging), the slew limiter
-// (plain moves), or the pan gain applied to the finished sample (start and end sounds).
-enum class Post { none, slew, pan };
+// What follows the equaliser and the clipper: nothing (pitch-raise staging, start and end
+// sounds) or the slew limiter (plain moves).
+enum class Post { none, slew };
 
 struct PostState {
-    double pan_gain[2];
     double decay;
     int16_t mem[2];  // slew memories, even and odd
 };
 
 template <Post kPost>
-[[gnu::always_inline]] inline int16_t post(int16_t d, double pan, double decay, int16_t& memory) {
+[[gnu::always_inline]] inline int16_t post(int16_t d, double decay, int16_t& memory) {
     if (kPost == Post::slew) {
         // |m - d| >= limit moves d to m -/+ limit: the same as clamping d into
         // [m - limit, m + limit], which compiles to conditional moves.
@@ -53,8 +52,6 @@ template <Post kPost>
         d = static_cast<int16_t>(v);
         // |d * decay| <= 32768: the conversion is always defined.
         memory = static_cast<int16_t>(static_cast<int32_t>(d * decay));
-    } else if (kPost == Post::pan) {
-        d = static_cast<int16_t>(kova::dsp::trunc_sat32(d * pan));
     }
     return d;
 }
@@ -64,24 +61,24 @@ template <Post kPost>
 // too, and here it runs in the shadow of the equaliser's. The equaliser state is loaded into a
 // local kernel per chunk: held in an object the caller can see, it would go through memory on
 // every sample (the envelope stores might alias it), adding a store and a load to the chain.
-template <Post kPost>
+template <Post kPost, bool kEnv = true>
 void serial_pass(KOVA_EQ* keq, const double* x, int64_t len, int16_t* dst, PostState& ps,
                  double* env, double& c, double step) {
     EqKernel eq(keq);
-    const double pan_even = ps.pan_gain[0];
-    const double pan_odd = ps.pan_gain[1];
     const double decay = ps.decay;
     int16_t mem_even = ps.mem[0];
     int16_t mem_odd = ps.mem[1];
     int64_t i = 0;
     for (; i + 1 < len; i += 2) {
-        c = c + step;
-        env[i] = c;
-        env[i + 1] = c;
-        dst[i] = post<kPost>(finish_input(eq, normalised(x[i])), pan_even, decay, mem_even);
-        dst[i + 1] = post<kPost>(finish_input(eq, normalised(x[i + 1])), pan_odd, decay, mem_odd);
+        if (kEnv) {
+            c = c + step;
+            env[i] = c;
+            env[i + 1] = c;
+        }
+        dst[i] = post<kPost>(finish_input(eq, normalised(x[i])), decay, mem_even);
+        dst[i + 1] = post<kPost>(finish_input(eq, normalised(x[i + 1])), decay, mem_odd);
     }
-    if (i < len) dst[i] = post<kPost>(finish_input(eq, normalised(x[i])), pan_even, decay, mem_even);
+    if (i < len) dst[i] = post<kPost>(finish_input(eq, normalised(x[i])), decay, mem_even);
     ps.mem[0] = mem_even;
     ps.mem[1] = mem_odd;
 }
@@ -148,7 +145,7 @@ void loop_blocks(KOVA_EQ* eq, LoopRender& r, int16_t* dst, int64_t count) {
     alignas(16) double x[kChunk];
     alignas(16) double env[kChunk];
     alignas(16) double o[kChunk];
-    PostState ps{{r.pan_gain[0], r.pan_gain[1]}, r.decay, {r.mem_even, r.mem_odd}};
+    PostState ps{r.decay, {r.mem_even, r.mem_odd}};
     double c = r.c;
     // The first chunk's envelope; every later one comes out of the serial pass before it.
     const int64_t first = count < kChunk ? count : kChunk;
@@ -182,18 +179,36 @@ void loop_blocks_by_factors(KOVA_EQ* eq, LoopRender& r, int16_t* dst, int64_t co
     }
 }
 
-template <Post kPost>
+// A finished sample times its pan gain: truncated and saturated to 32 bits like trunc_sat32,
+// then its low 16 bits.
+inline int16_t pan_finished(int16_t s, double pan) {
+    return static_cast<int16_t>(static_cast<int32_t>(eq_input(s * pan)));
+}
+
+// Start and end sounds: first pass (gain, truncation), the serial pass, then with panning the
+// pan gain on the finished samples, which depends on nothing serial and runs vectorised.
+template <bool kPan>
 void once_blocks(KOVA_EQ* eq, const int16_t* pcm, int64_t count, double gain,
                  const double pan_gain[2], int16_t* dst) {
-    alignas(16) double x[kChunk];
-    alignas(16) double unused_env[kChunk];
+    alignas(64) double x[kChunk];
     double unused_c = 0.0;
-    PostState ps{{pan_gain[0], pan_gain[1]}, 1.0, {0, 0}};
+    PostState ps{1.0, {0, 0}};
+    const double pan_even = pan_gain[0];
+    const double pan_odd = pan_gain[1];
     for (int64_t done = 0; done < count; done += kChunk) {
         const int64_t len = (count - done < kChunk) ? count - done : kChunk;
         const int16_t* src = pcm + done;
+        int16_t* out = dst + done;
         for (int64_t i = 0; i < len; ++i) x[i] = eq_input(gain * src[i]);
-        serial_pass<kPost>(eq, x, len, dst + done, ps, unused_env, unused_c, 0.0);
+        serial_pass<Post::none, false>(eq, x, len, out, ps, nullptr, unused_c, 0.0);
+        if (kPan) {
+            int64_t i = 0;
+            for (; i + 1 < len; i += 2) {
+                out[i] = pan_finished(out[i], pan_even);
+                out[i + 1] = pan_finished(out[i + 1], pan_odd);
+            }
+            if (i < len) out[i] = pan_finished(out[i], pan_even);
+        }
     }
 }
 
@@ -213,9 +228,9 @@ void render_once(KOVA_EQ* eq, const int16_t* pcm, int64_t count, double gain,
     if (count < 1) return;
     // The pan gain multiplies the finished sample; a gain of 1.0 keeps it as it is.
     if (pan_gain[0] == 1.0 && pan_gain[1] == 1.0) {
-        once_blocks<Post::none>(eq, pcm, count, gain, pan_gain, dst);
+        once_blocks<false>(eq, pcm, count, gain, pan_gain, dst);
     } else {
-        once_blocks<Post::pan>(eq, pcm, count, gain, pan_gain, dst);
+        once_blocks<true>(eq, pcm, count, gain, pan_gain, dst);
     }
 }
 
