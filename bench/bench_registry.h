@@ -7,6 +7,7 @@ namespace kova_bench {
 void register_resample_benchmarks();
 void register_ringbuffer_benchmarks();
 void register_generate_benchmarks();
+void register_paced_benchmarks();
 // Not timed: heap figures per instance, written into the preamble.
 void report_memory();
 // Not timed by the framework: strokes of 20 instances starting at once, waits on the registry
