@@ -13,6 +13,8 @@ void report_memory();
 // Not timed by the framework: strokes of 20 instances starting at once, waits on the registry
 // lock, written into the preamble.
 void report_registry_wait();
+// Not timed by the framework: event-to-device latency through a started stream, in real time.
+void report_latency();
 
 }  // namespace kova_bench
 

@@ -63,7 +63,8 @@ double percentile(std::vector<double> v, double p) {
 void report_registry_wait() {
     std::vector<jlong> ids;
     for (int i = 0; i < kInstances; ++i) {
-        const jlong id = Java_com_corvane_audio_Kova_init(nullptr, nullptr, 48000, 2, 1, 1080, 2280);
+        const jlong id =
+            Java_com_corvane_audio_Kova_init(nullptr, nullptr, 48000, 2, 1, 1080, 2280);
         if (id < 1) break;
         int32_t err = 0;
         KOVA_CTX* ctx = pKOVAInfo[id - 1].pInstance->pCtx;
@@ -119,8 +120,9 @@ void report_registry_wait() {
                << "| one start alone (lock held), us | " << fixed(hold, 0) << " | "
                << fixed(percentile(alone, 0.99), 0) << " | " << fixed(percentile(alone, 1.0), 0)
                << " | - |\n"
-               << "| return after the common instant, ms | " << fixed(percentile(done, 0.5) / 1e3, 2)
-               << " | " << fixed(percentile(done, 0.99) / 1e3, 2) << " | "
+               << "| return after the common instant, ms | "
+               << fixed(percentile(done, 0.5) / 1e3, 2) << " | "
+               << fixed(percentile(done, 0.99) / 1e3, 2) << " | "
                << fixed(percentile(done, 1.0) / 1e3, 2) << " | - |\n"
                << "| wait (return less one start alone), ms | "
                << fixed(percentile(wait, 0.5) / 1e3, 2) << " | " << fixed(p99 / 1e3, 2) << " | "

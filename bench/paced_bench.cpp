@@ -17,7 +17,7 @@
 namespace kova_bench {
 namespace {
 
-constexpr int kEvents = 60;  // about one second of moves per repetition
+constexpr int kEvents = 60;                // about one second of moves per repetition
 constexpr size_t kEvictBytes = 32u << 20;  // larger than the last-level cache
 
 double now_s() {
