@@ -5,8 +5,6 @@
 // a poller notes when the captured count passes each event's first byte. Once with the
 // 200 ms start sound of the benchmark files and once with a 40 ms one: the start sound is
 // queued whole ahead of the moves, so its length is added to every move's latency.
-#include <jni.h>
-#include <time.h>
 
 #include <algorithm>
 #include <atomic>
@@ -16,21 +14,14 @@
 #include <thread>
 #include <vector>
 
+#include "bench_clock.h"
 #include "bench_files.h"
 #include "bench_registry.h"
+#include "jni_entries.h"
 #include "kova/kova_engine.h"
 #include "kova/kova_registry.h"
 #include "kova_host/audio_sink.h"
 #include "summary.h"
-
-extern "C" {
-jlong Java_com_corvane_audio_Kova_init(JNIEnv*, jclass, jint, jint, jint, jint, jint);
-jint Java_com_corvane_audio_Kova_deinit(JNIEnv*, jclass, jlong);
-jint Java_com_corvane_audio_Kova_gen_1tofasttrack(JNIEnv*, jclass, jlong, jfloat, jfloat, jlong,
-                                                  jfloat, jint);
-void Java_com_corvane_audio_Kova_start_1fasttrack(JNIEnv*, jclass, jlong);
-void Java_com_corvane_audio_Kova_stop_1fasttrack(JNIEnv*, jclass, jlong);
-}
 
 namespace kova_bench {
 namespace {
@@ -40,17 +31,7 @@ constexpr double kBytesPerMs = 192.0;       // 48000 Hz, 2 channels, 16 bits
 constexpr int32_t kShortStartBytes = 7680;  // 40 ms
 
 double now_ms() {
-    timespec t{};
-    clock_gettime(CLOCK_MONOTONIC, &t);
-    return static_cast<double>(t.tv_sec) * 1e3 + static_cast<double>(t.tv_nsec) / 1e6;
-}
-
-void sleep_until_ms(double at) {
-    timespec t{};
-    t.tv_sec = static_cast<time_t>(at / 1e3);
-    t.tv_nsec = static_cast<long>((at - static_cast<double>(t.tv_sec) * 1e3) * 1e6);
-    while (clock_nanosleep(CLOCK_MONOTONIC, TIMER_ABSTIME, &t, nullptr) != 0) {
-    }
+    return now_s() * 1e3;
 }
 
 struct Sent {
@@ -105,7 +86,7 @@ StrokeFigures run_stroke(jlong id) {
     int64_t time = 1000;
     double tick = now_ms() + 10.0;
     for (int e = 0; e <= kMoves + 1; ++e) {
-        sleep_until_ms(tick);
+        sleep_until_s(tick / 1e3);
         const jint action = e == 0 ? KOVA_ACTION_START : (e > kMoves ? KOVA_ACTION_END : 1);
         if (e > 0) {
             x += (e / 8) % 2 ? 0.0f : 16.0f;
@@ -122,7 +103,7 @@ StrokeFigures run_stroke(jlong id) {
         tick += 16.0;
     }
     const double give_up = now_ms() + 2000.0;
-    while (kova_host_capture_size() < written && now_ms() < give_up) sleep_until_ms(now_ms() + 5);
+    while (kova_host_capture_size() < written && now_ms() < give_up) sleep_until_s(now_s() + 0.005);
     stop = true;
     poller.join();
 

@@ -3,8 +3,6 @@
 // the process-wide registry lock while it generates its start sound. Figures: how long after the
 // common instant each call returns, and the part of that spent waiting (the return time less the
 // time one start takes alone).
-#include <jni.h>
-#include <time.h>
 
 #include <algorithm>
 #include <cstdint>
@@ -12,20 +10,13 @@
 #include <thread>
 #include <vector>
 
+#include "bench_clock.h"
 #include "bench_files.h"
 #include "bench_registry.h"
+#include "jni_entries.h"
 #include "kova/kova_engine.h"
 #include "kova/kova_registry.h"
 #include "summary.h"
-
-// Entry points that use neither the JNI environment nor the class.
-extern "C" {
-jlong Java_com_corvane_audio_Kova_init(JNIEnv*, jclass, jint, jint, jint, jint, jint);
-jint Java_com_corvane_audio_Kova_deinit(JNIEnv*, jclass, jlong);
-jint Java_com_corvane_audio_Kova_gen_1tofasttrack(JNIEnv*, jclass, jlong, jfloat, jfloat, jlong,
-                                                  jfloat, jint);
-void Java_com_corvane_audio_Kova_stop_1fasttrack(JNIEnv*, jclass, jlong);
-}
 
 namespace kova_bench {
 namespace {
@@ -34,17 +25,7 @@ constexpr int kInstances = KOVA_MAX_INSTANCES;
 constexpr int kRounds = 50;
 
 double now_us() {
-    timespec t{};
-    clock_gettime(CLOCK_MONOTONIC, &t);
-    return static_cast<double>(t.tv_sec) * 1e6 + static_cast<double>(t.tv_nsec) / 1e3;
-}
-
-void sleep_until_us(double at) {
-    timespec t{};
-    t.tv_sec = static_cast<time_t>(at / 1e6);
-    t.tv_nsec = static_cast<long>((at - static_cast<double>(t.tv_sec) * 1e6) * 1e3);
-    while (clock_nanosleep(CLOCK_MONOTONIC, TIMER_ABSTIME, &t, nullptr) != 0) {
-    }
+    return now_s() * 1e6;
 }
 
 jint start_stroke(jlong id) {
@@ -102,7 +83,7 @@ void report_registry_wait() {
         std::vector<std::thread> threads;
         for (int i = 0; i < kInstances; ++i) {
             threads.emplace_back([&, i] {
-                sleep_until_us(at);
+                sleep_until_s(at / 1e6);
                 start_stroke(ids[static_cast<size_t>(i)]);
                 done[static_cast<size_t>(round * kInstances + i)] = now_us() - at;
             });

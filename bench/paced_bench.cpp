@@ -2,13 +2,12 @@
 // (an application and the system run between two touch events). Wall time of each call, next
 // to the back-to-back figure of the same move, which keeps its data cached and understates
 // what an event costs in use.
-#include <time.h>
-
 #include <cstdint>
 #include <ostream>
 #include <string>
 #include <vector>
 
+#include "bench_clock.h"
 #include "bench_files.h"
 #include "bench_registry.h"
 #include "kova/kova_engine.h"
@@ -19,20 +18,6 @@ namespace {
 
 constexpr int kEvents = 60;                // about one second of moves per repetition
 constexpr size_t kEvictBytes = 32u << 20;  // larger than the last-level cache
-
-double now_s() {
-    timespec t{};
-    clock_gettime(CLOCK_MONOTONIC, &t);
-    return static_cast<double>(t.tv_sec) + static_cast<double>(t.tv_nsec) / 1e9;
-}
-
-void sleep_until_s(double at) {
-    timespec t{};
-    t.tv_sec = static_cast<time_t>(at);
-    t.tv_nsec = static_cast<long>((at - static_cast<double>(t.tv_sec)) * 1e9);
-    while (clock_nanosleep(CLOCK_MONOTONIC, TIMER_ABSTIME, &t, nullptr) != 0) {
-    }
-}
 
 // Writes over a buffer larger than the caches, so the next event finds none of its data there.
 void evict(std::vector<uint8_t>& junk) {
