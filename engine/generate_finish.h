@@ -65,7 +65,10 @@ class EqKernel {
 
     int32_t proc(int32_t sample) { return proc_input(static_cast<double>(sample) / kFullScale); }
 
-    /* The same step from an input already normalised (sample / 2147483647.0). */
+    /* The same step from an input already normalised (sample / 2147483647.0). With kUnitMid
+     * the mid band's gain, always 1.0 in the library's equaliser, is left out: multiplying by
+     * 1.0 changes no bit, and one multiply less per sample shows in the generator's loop. */
+    template <bool kUnitMid = false>
     int32_t proc_input(double x) {
         constexpr double kStateBias = 2.3283064370807974e-10;
         low_state_ = low_state_ + (low_coef_ * (x - low_state_) + kStateBias);
@@ -74,7 +77,8 @@ class EqKernel {
         const double low = low_state_;
         const double high = delayed - high_state_;
         const double mid = delayed - (low + high);
-        const double y = (high * high_gain_ + (low * low_gain_ + mid * mid_gain_)) * kFullScale;
+        const double mid_part = kUnitMid ? mid : mid * mid_gain_;
+        const double y = (high * high_gain_ + (low * low_gain_ + mid_part)) * kFullScale;
         h2_ = h1_;
         h1_ = h0_;
         h0_ = x;
@@ -100,8 +104,9 @@ class EqKernel {
 
 /* Equaliser (from a normalised input), then clipping with rotating replacement values, then
  * 16 bits. */
+template <bool kUnitMid = false>
 inline int16_t finish_input(EqKernel& eq, double x) {
-    int32_t r = eq.proc_input(x);
+    int32_t r = eq.proc_input<kUnitMid>(x);
     if (r >= kClipHigh) [[unlikely]] {
         if (clip_count_hi >= kClipWrap) clip_count_hi = 0;
         clip_count_hi = static_cast<int16_t>(clip_count_hi + kClipStep);

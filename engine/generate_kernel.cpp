@@ -61,7 +61,7 @@ template <Post kPost>
 // too, and here it runs in the shadow of the equaliser's. The equaliser state is loaded into a
 // local kernel per chunk: held in an object the caller can see, it would go through memory on
 // every sample (the envelope stores might alias it), adding a store and a load to the chain.
-template <Post kPost, bool kEnv = true>
+template <Post kPost, bool kEnv, bool kUnitMid>
 void serial_pass(KOVA_EQ* keq, const double* x, int64_t len, int16_t* dst, PostState& ps,
                  double* env, double& c, double step) {
     EqKernel eq(keq);
@@ -75,12 +75,24 @@ void serial_pass(KOVA_EQ* keq, const double* x, int64_t len, int16_t* dst, PostS
             env[i] = c;
             env[i + 1] = c;
         }
-        dst[i] = post<kPost>(finish_input(eq, normalised(x[i])), decay, mem_even);
-        dst[i + 1] = post<kPost>(finish_input(eq, normalised(x[i + 1])), decay, mem_odd);
+        dst[i] = post<kPost>(finish_input<kUnitMid>(eq, normalised(x[i])), decay, mem_even);
+        dst[i + 1] = post<kPost>(finish_input<kUnitMid>(eq, normalised(x[i + 1])), decay, mem_odd);
     }
-    if (i < len) dst[i] = post<kPost>(finish_input(eq, normalised(x[i])), decay, mem_even);
+    if (i < len) dst[i] = post<kPost>(finish_input<kUnitMid>(eq, normalised(x[i])), decay, mem_even);
     ps.mem[0] = mem_even;
     ps.mem[1] = mem_odd;
+}
+
+// The serial pass, without the mid band's multiply when its gain is 1.0 (it always is in the
+// library's own equaliser; a record set up by hand may differ).
+template <Post kPost, bool kEnv = true>
+void serial_pass_for(KOVA_EQ* keq, const double* x, int64_t len, int16_t* dst, PostState& ps,
+                     double* env, double& c, double step) {
+    if (keq->mid_gain == 1.0) {
+        serial_pass<kPost, kEnv, true>(keq, x, len, dst, ps, env, c, step);
+    } else {
+        serial_pass<kPost, kEnv, false>(keq, x, len, dst, ps, env, c, step);
+    }
 }
 
 // First pass of a move over `len` samples of one stretch of the loop (no wrap inside): gain x
@@ -158,7 +170,7 @@ void loop_blocks(KOVA_EQ* eq, LoopRender& r, int16_t* dst, int64_t count) {
         const int64_t len = (count - done < kChunk) ? count - done : kChunk;
         if (kOsc) _osc_fill(r.osc, o, len);
         loop_products<kOsc, kPan>(r, env, o, x, len);
-        serial_pass<kPost>(eq, x, len, dst + done, ps, env, c, r.step);
+        serial_pass_for<kPost>(eq, x, len, dst + done, ps, env, c, r.step);
     }
     r.mem_even = ps.mem[0];
     r.mem_odd = ps.mem[1];
@@ -200,7 +212,7 @@ void once_blocks(KOVA_EQ* eq, const int16_t* pcm, int64_t count, double gain,
         const int16_t* src = pcm + done;
         int16_t* out = dst + done;
         for (int64_t i = 0; i < len; ++i) x[i] = eq_input(gain * src[i]);
-        serial_pass<Post::none, false>(eq, x, len, out, ps, nullptr, unused_c, 0.0);
+        serial_pass_for<Post::none, false>(eq, x, len, out, ps, nullptr, unused_c, 0.0);
         if (kPan) {
             int64_t i = 0;
             for (; i + 1 < len; i += 2) {
