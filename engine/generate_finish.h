@@ -33,9 +33,14 @@ struct GenBlock {
     double pan_gain[2]; /* even (left) and odd (right) samples; 1.0 each when panning is off */
 };
 
-/* trunc_sat32 with the common in-range case tested first (one comparison instead of three). */
+/* trunc_sat32 with the common in-range case tested first, on the exponent bits: |v| < 2^31
+ * (where the conversion is defined and equals the saturated one) exactly when the biased
+ * exponent is below 1023 + 31; NaN and infinities have the largest exponent. An integer test
+ * leaves the floating-point ports, which the equaliser's chain needs, to the chain. */
 inline int32_t trunc32(double v) {
-    if (__builtin_fabs(v) < 2147483647.0) [[likely]]
+    uint64_t bits;
+    __builtin_memcpy(&bits, &v, sizeof bits);
+    if (((bits >> 52) & 0x7FF) < 1023 + 31) [[likely]]
         return static_cast<int32_t>(v);
     return kova::dsp::trunc_sat32(v);
 }
