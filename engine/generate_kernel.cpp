@@ -78,7 +78,8 @@ void serial_pass(KOVA_EQ* keq, const double* x, int64_t len, int16_t* dst, PostS
         dst[i] = post<kPost>(finish_input<kUnitMid>(eq, normalised(x[i])), decay, mem_even);
         dst[i + 1] = post<kPost>(finish_input<kUnitMid>(eq, normalised(x[i + 1])), decay, mem_odd);
     }
-    if (i < len) dst[i] = post<kPost>(finish_input<kUnitMid>(eq, normalised(x[i])), decay, mem_even);
+    if (i < len)
+        dst[i] = post<kPost>(finish_input<kUnitMid>(eq, normalised(x[i])), decay, mem_even);
     ps.mem[0] = mem_even;
     ps.mem[1] = mem_odd;
 }
