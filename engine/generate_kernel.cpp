@@ -5,6 +5,7 @@
 #include <cstdint>
 
 #include "kova/kova_dsp.h"
+#include "dsp/dsp_internal.h"
 #include "engine/generate_finish.h"
 
 namespace kova_gen {
