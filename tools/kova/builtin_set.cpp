@@ -31,7 +31,8 @@ KOVA_FLT_DSC builtin_filter(const KOVA_FORMAT& format) {
 
 void builtin_levels(KOVA_TUNE_SET& tune) {
     // The library's registration levels (wn_gain 0.5, start/end 0.6) with its output volume of
-    // 0.8 leave a default render near -15 dBFS; these bring its peak to about -3 dBFS.
+    // 0.8 leave a default render near -15 dBFS; these bring its peak to about -5 dBFS (the loop is
+    // held near -15 dBFS by the engine's slew limiter).
     tune.gain = 1.0;
     tune.pan = 0.2; /* a touch in the middle plays at 0.9 on both sides instead of 0.8 */
     tune.wn_gain = 1.0;
