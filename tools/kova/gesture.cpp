@@ -26,32 +26,15 @@ struct Point {
     double y;
 };
 
-std::string trim(const std::string& s) {
-    const size_t a = s.find_first_not_of(" \t\r");
-    if (a == std::string::npos) return "";
-    const size_t b = s.find_last_not_of(" \t\r");
-    return s.substr(a, b - a + 1);
-}
-
+/* The cells of one CSV line, trimmed. */
 std::vector<std::string> split(const std::string& line) {
-    std::vector<std::string> cells;
-    size_t from = 0;
-    for (;;) {
-        const size_t comma = line.find(',', from);
-        cells.push_back(trim(line.substr(from, comma - from)));
-        if (comma == std::string::npos) break;
-        from = comma + 1;
-    }
+    std::vector<std::string> cells = CLI::detail::split(line, ',');
+    for (std::string& c : cells) CLI::detail::trim(c);
     return cells;
 }
 
-std::string lower(std::string s) {
-    for (char& c : s) c = static_cast<char>(std::tolower(static_cast<unsigned char>(c)));
-    return s;
-}
-
 bool parse_action(const std::string& text, uint32_t& action) {
-    const std::string a = lower(text);
+    const std::string a = CLI::detail::to_lower(text);
     if (a == "down" || a == "start" || a == "0") {
         action = KOVA_ACTION_START;
     } else if (a == "move" || a == "1") {
@@ -187,11 +170,11 @@ std::vector<TouchEvent> read_gesture_csv(const std::string& path) {
     };
     while (std::getline(in, line)) {
         ++lineno;
-        const std::string t = trim(line);
+        const std::string t = CLI::detail::trim_copy(line);
         if (t.empty() || t[0] == '#') continue;
         std::vector<std::string> cells = split(t);
         if (!header) {
-            for (std::string& c : cells) c = lower(c);
+            for (std::string& c : cells) c = CLI::detail::to_lower(c);
             const bool ok = cells.size() >= 4 && cells.size() <= 5 && cells[0] == "time_ms" &&
                             cells[1] == "action" && cells[2] == "x" && cells[3] == "y" &&
                             (cells.size() == 4 || cells[4] == "aux");

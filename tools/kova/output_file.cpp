@@ -6,6 +6,8 @@
 
 #include <cerrno>
 #include <cstring>
+#include <fstream>
+#include <iterator>
 #include <vector>
 
 #include "cli.h"
@@ -71,16 +73,11 @@ void OutputFile::commit() {
     };
     if (to_stdout(path_)) {
         // By name: the library may have written the file through a descriptor of its own.
-        std::FILE* in = std::fopen(temp_.c_str(), "rb");
-        if (!in) fail(std::strerror(errno));
-        std::vector<char> buf(1 << 16);
-        size_t n = 0;
-        while ((n = std::fread(buf.data(), 1, buf.size(), in)) > 0) {
-            if (std::fwrite(buf.data(), 1, n, out()) != n) break;
-        }
-        const bool ok = !std::ferror(in) && !std::ferror(out()) && std::fflush(out()) == 0;
-        std::fclose(in);
-        if (!ok) fail(std::strerror(errno));
+        std::ifstream in(temp_, std::ios::binary);
+        const std::string data{std::istreambuf_iterator<char>(in), {}};
+        if (!in.good() && !in.eof()) fail(std::strerror(errno));
+        if (std::fwrite(data.data(), 1, data.size(), out()) != data.size() || std::fflush(out()))
+            fail(std::strerror(errno));
         return;  // the destructor removes the temporary file
     }
     if (fd_ >= 0) {

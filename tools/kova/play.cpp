@@ -71,12 +71,20 @@ uint32_t ring_fill(KOVA_FASTTRACK* ft) {
 struct Counts {
     std::atomic<size_t> events{0}, blocks{0}, dropped{0};
     std::atomic<uint64_t> bytes{0};
-    std::atomic<unsigned long> underruns{0};
+    std::atomic<unsigned long> underruns{0}; /* while a stroke is held, not in pauses */
+    unsigned long stroke_base = 0;           /* the device's count when the stroke began */
+    bool in_stroke = false;
     size_t total_events = 0;
     int64_t start_ms = 0;
     std::optional<std::string> capture;
     std::string capture_temp; /* removed if the watchdog ends the process */
     std::atomic<bool> reported{false};
+
+    void stroke(bool begins) {
+        if (in_stroke) underruns += kova_host_underruns() - stroke_base;
+        stroke_base = kova_host_underruns();
+        in_stroke = begins;
+    }
 
     /* The summary line, printed once by whoever gets here first. */
     void report(int sig) {
@@ -94,63 +102,31 @@ struct Counts {
     }
 };
 
-/* Underruns counted while a stroke is held (between a pause's underruns and the device's own). */
-class Underruns {
-   public:
-    void stroke_begins() {
-        in_stroke_ = true;
-        base_ = kova_host_underruns();
-    }
-    void stroke_ends() {
-        if (in_stroke_) done_ += kova_host_underruns() - base_;
-        in_stroke_ = false;
-    }
-    unsigned long count() const { return done_ + (in_stroke_ ? kova_host_underruns() - base_ : 0); }
-
-   private:
-    bool in_stroke_ = false;
-    unsigned long base_ = 0, done_ = 0;
-};
-
-/* "[#########-----------]  1.20 / 3.18 s   ring  45 ms   dropped 0   underruns 0" on a terminal. */
-class Status {
-   public:
-    Status(KOVA_FASTTRACK* ft, const KOVA_FORMAT& f, int64_t total_ms, const Counts& counts,
-           const Underruns& underruns)
-        : ft_(ft),
-          bytes_per_ms_(f.sample_rate * f.channels * 2 / 1000.0),
-          total_ms_(std::max<int64_t>(total_ms, 1)),
-          counts_(counts),
-          underruns_(underruns),
-          tty_(isatty(STDERR_FILENO) == 1 && !quiet()) {}
+/* The status line on a terminal, refreshed while the command waits:
+ * "[#########-------]  1.20 / 3.18 s   ring  45 ms   dropped 0   underruns 0". */
+struct Status {
+    KOVA_FASTTRACK* ft;
+    double bytes_per_ms;
+    int64_t total_ms;
+    const Counts& counts;
+    bool tty = isatty(STDERR_FILENO) == 1 && !quiet();
+    bool shown = false;
 
     void show(int64_t elapsed_ms) {
-        if (!tty_) return;
-        constexpr int kWidth = 24;
-        const int done =
-            static_cast<int>(std::min<int64_t>(elapsed_ms, total_ms_) * kWidth / total_ms_);
+        if (!tty) return;
+        constexpr int64_t kWidth = 24;
+        const auto done = static_cast<size_t>(std::min(elapsed_ms, total_ms) * kWidth / total_ms);
         std::fprintf(stderr,
                      "\r  [%s%s] %6.2f / %.2f s   ring %4.0f ms   dropped %zu   underruns %lu ",
-                     std::string(static_cast<size_t>(done), '#').c_str(),
-                     std::string(static_cast<size_t>(kWidth - done), '-').c_str(),
-                     elapsed_ms / 1000.0, total_ms_ / 1000.0, ring_fill(ft_) / bytes_per_ms_,
-                     counts_.dropped.load(), underruns_.count());
+                     std::string(done, '#').c_str(), std::string(kWidth - done, '-').c_str(),
+                     elapsed_ms / 1000.0, total_ms / 1000.0, ring_fill(ft) / bytes_per_ms,
+                     counts.dropped.load(), counts.underruns.load());
         std::fflush(stderr);
-        shown_ = true;
+        shown = true;
     }
     void finish() {
-        if (shown_) std::fputc('\n', stderr);
-        shown_ = false;
+        if (shown) std::fputc('\n', stderr);
     }
-
-   private:
-    KOVA_FASTTRACK* ft_;
-    double bytes_per_ms_;
-    int64_t total_ms_;
-    const Counts& counts_;
-    const Underruns& underruns_;
-    bool tty_;
-    bool shown_ = false;
 };
 
 /* Sleeps until `until` (monotonic ms), refreshing the status line on the way. */
@@ -248,14 +224,14 @@ int run_play(PlayOptions& o) {
     std::fflush(info());
     kova_start_fasttrack(ft);
     const int64_t t0 = events.front().time_ms;
-    Underruns underruns;
-    Status status(ft, fmt, events.back().time_ms - t0, counts, underruns);
+    const double bytes_per_ms = fmt.sample_rate * fmt.channels * 2 / 1000.0;
+    Status status{ft, bytes_per_ms, std::max<int64_t>(events.back().time_ms - t0, 1), counts};
     std::vector<int16_t> block(kBlockBytes / 2);
     const int64_t start = counts.start_ms = now_ms();
     for (const TouchEvent& e : events) {
         wait_until(start + (e.time_ms - t0), start, status);
         if (g_signal.load()) break;
-        if (e.action == KOVA_ACTION_START) underruns.stroke_begins();
+        if (e.action == KOVA_ACTION_START) counts.stroke(true);
         const int32_t bytes = generate_event(engine, e, block);
         if (bytes > 0) {
             // All or nothing: a block that does not fit the ring is refused and dropped.
@@ -269,21 +245,17 @@ int run_play(PlayOptions& o) {
             }
         }
         ++counts.events;
-        if (e.action == KOVA_ACTION_END) underruns.stroke_ends();
-        counts.underruns = underruns.count();
+        if (e.action == KOVA_ACTION_END) counts.stroke(false);
     }
     // Let the device play out what is queued.
     const int64_t drain_deadline =
-        now_ms() +
-        static_cast<int64_t>(ring_fill(ft) / (fmt.sample_rate * fmt.channels * 2 / 1000.0)) +
-        kDrainSlackMs;
+        now_ms() + static_cast<int64_t>(ring_fill(ft) / bytes_per_ms) + kDrainSlackMs;
     while (!g_signal.load() && ring_fill(ft) > 0 && now_ms() < drain_deadline) {
         status.show(now_ms() - start);
         sleep_ms(10);
     }
     if (!g_signal.load()) sleep_ms(2 * kStatusPeriodMs);  // the device's own buffer
-    underruns.stroke_ends();
-    counts.underruns = underruns.count();
+    counts.stroke(false);
     status.show(now_ms() - start);
     status.finish();
 

@@ -43,6 +43,21 @@ FileInfo query(const std::string& path) {
     return info;
 }
 
+/* Not-a-number values (possible in a file) dump as null, as JSON has no NaN. */
+nlohmann::ordered_json tune_json(const KOVA_TUNE_SET& t) {
+    return {{"gain", t.gain},
+            {"pan", t.pan},
+            {"osc_enable", t.osc_enable},
+            {"osc_depth", t.osc_depth},
+            {"sharp_enable", t.sharp_enable},
+            {"sharpness", t.sharpness},
+            {"wn_gain", t.wn_gain},
+            {"file_gain", t.file_gain},
+            {"start_gain", t.start_gain},
+            {"loop_gain", t.loop_gain},
+            {"end_gain", t.end_gain}};
+}
+
 void print_text(const std::string& path, const FileInfo& in) {
     std::FILE* f = out();
     std::fprintf(f, "source-set file %s\n\nslots:\n", path.c_str());
@@ -68,18 +83,9 @@ void print_text(const std::string& path, const FileInfo& in) {
                      d.channels == 1 ? "" : "s");
     }
     if (!any) std::fprintf(f, "  (none)\n");
-    const KOVA_TUNE_SET& t = in.tune;
     std::fprintf(f, "\ntune set:\n");
-    std::fprintf(f, "  gain        %s\n  pan         %s\n", num(t.gain).c_str(),
-                 num(t.pan).c_str());
-    std::fprintf(f, "  oscillator  %s, depth %s\n", t.osc_enable == 1 ? "on" : "off",
-                 num(t.osc_depth).c_str());
-    std::fprintf(f, "  sharpening  %s, sharpness %s\n", t.sharp_enable == 1 ? "on" : "off",
-                 num(t.sharpness).c_str());
-    std::fprintf(f, "  wn_gain     %s\n  file_gain   %s\n", num(t.wn_gain).c_str(),
-                 num(t.file_gain).c_str());
-    std::fprintf(f, "  start_gain  %s\n  loop_gain   %s\n  end_gain    %s\n",
-                 num(t.start_gain).c_str(), num(t.loop_gain).c_str(), num(t.end_gain).c_str());
+    for (const auto& [name, value] : tune_json(in.tune).items())
+        std::fprintf(f, "  %-12s %s\n", name.c_str(), value.dump().c_str());
 }
 
 void print_json(const std::string& path, const FileInfo& in) {
@@ -105,21 +111,8 @@ void print_json(const std::string& path, const FileInfo& in) {
                            {"samplerate", d.samplerate},
                            {"channels", d.channels}});
     }
-    const KOVA_TUNE_SET& t = in.tune;
-    const nlohmann::ordered_json tune = {{"gain", t.gain},
-                                         {"pan", t.pan},
-                                         {"osc_enable", t.osc_enable},
-                                         {"osc_depth", t.osc_depth},
-                                         {"sharp_enable", t.sharp_enable},
-                                         {"sharpness", t.sharpness},
-                                         {"wn_gain", t.wn_gain},
-                                         {"file_gain", t.file_gain},
-                                         {"start_gain", t.start_gain},
-                                         {"loop_gain", t.loop_gain},
-                                         {"end_gain", t.end_gain}};
     const nlohmann::ordered_json j = {
-        {"file", path}, {"slots", slots}, {"filters", filters}, {"tune", tune}};
-    // Not-a-number values (possible in a file) become null, as JSON has no NaN.
+        {"file", path}, {"slots", slots}, {"filters", filters}, {"tune", tune_json(in.tune)}};
     std::fprintf(out(), "%s\n", j.dump(2).c_str());
 }
 
