@@ -37,6 +37,10 @@ int main(int argc, char** argv) {
     for (const auto& command : commands) {
         if (argc > 1 && command.first == std::string(argv[1])) prefix += " " + std::string(argv[1]);
     }
+    if (argc > 1 && argv[1][0] != '-' && prefix == "kova") {
+        std::fprintf(stderr, "kova: unknown command '%s' (see kova --help)\n", argv[1]);
+        return kExitUsage;
+    }
     int rc = kExitOk;
     try {
         app.parse(argc, argv);

@@ -297,7 +297,7 @@ void finish_setup(SetupOptions& s) {
                     "(--filter)");
     }
     const bool has_loop =
-        !src.set_path.empty() || !src.slot[KOVA_SLOT_LOOP].empty() || !src.filters.empty();
+        !src.set_path.empty() || !src.slot[KOVA_SLOT_LOOP].empty() || !src.filter_texts.empty();
     if (!has_loop && (!src.slot[KOVA_SLOT_START].empty() || !src.slot[KOVA_SLOT_END].empty())) {
         usage_error(
             "--start and --end need a loop: give --loop FILE, --filter TYPE:FREQ[:BANDWIDTH] or "
