@@ -34,17 +34,14 @@ std::vector<std::string> split(const std::string& line) {
 }
 
 bool parse_action(const std::string& text, uint32_t& action) {
-    const std::string a = CLI::detail::to_lower(text);
-    if (a == "down" || a == "start" || a == "0") {
-        action = KOVA_ACTION_START;
-    } else if (a == "move" || a == "1") {
-        action = KOVA_ACTION_MOVE;
-    } else if (a == "up" || a == "end" || a == "2") {
-        action = KOVA_ACTION_END;
-    } else {
-        return false;
+    static const std::pair<const char*, uint32_t> names[] = {
+        {"down", KOVA_ACTION_START}, {"start", KOVA_ACTION_START}, {"0", KOVA_ACTION_START},
+        {"move", KOVA_ACTION_MOVE},  {"1", KOVA_ACTION_MOVE},      {"up", KOVA_ACTION_END},
+        {"end", KOVA_ACTION_END},    {"2", KOVA_ACTION_END}};
+    for (const auto& [name, code] : names) {
+        if (CLI::detail::to_lower(text) == name) return action = code, true;
     }
-    return true;
+    return false;
 }
 
 bool parse_number(const std::string& text, double& v) {
@@ -82,76 +79,47 @@ double ease(double s, double swing) {
     return s - swing * std::sin(2.0 * std::numbers::pi * s) / (2.0 * std::numbers::pi);
 }
 
-/* About 0.4 to 0.7 px/ms down the screen: a slow scroll. Every 8 ms step stays above the 3 px the
- * engine needs to count a move. */
-void slow_stroke(std::vector<TouchEvent>& ev, int64_t t0, int64_t ms, uint32_t hz, double cx,
-                 double cy, uint32_t w, uint32_t h) {
-    append_stroke(
-        ev, t0, ms, hz,
-        [&](double s) {
-            const double u = ease(s, 0.25);
-            return Point{cx - 60.0 + 120.0 * u + 40.0 * std::sin(2.0 * std::numbers::pi * u),
-                         cy - 450.0 + 900.0 * u};
-        },
-        w, h);
-}
-
-/* A flick of about 1400 px in 300 ms: from rest up to about 9 px/ms and back. */
-void fast_stroke(std::vector<TouchEvent>& ev, int64_t t0, uint32_t hz, double cx, double cy,
-                 uint32_t w, uint32_t h) {
-    append_stroke(
-        ev, t0, 300, hz,
-        [&](double s) {
-            const double u = ease(s, 0.8);
-            return Point{cx - 300.0 + 600.0 * u, cy + 600.0 - 1300.0 * u};
-        },
-        w, h);
-}
-
-/* A sweep of about 1.4 px/ms to the right along an arc. */
-void medium_stroke(std::vector<TouchEvent>& ev, int64_t t0, uint32_t hz, double cx, double cy,
-                   uint32_t w, uint32_t h) {
-    append_stroke(
-        ev, t0, 600, hz,
-        [&](double s) {
-            const double u = ease(s, 0.5);
-            return Point{cx - 400.0 + 800.0 * u,
-                         cy + 200.0 - 300.0 * std::sin(std::numbers::pi * u)};
-        },
-        w, h);
-}
-
 }  // namespace
 
-const char* const kBuiltinGestureNames = "slow, fast, strokes";
-
 const char* action_name(uint32_t action) {
-    switch (action) {
-        case KOVA_ACTION_START:
-            return "down";
-        case KOVA_ACTION_MOVE:
-            return "move";
-        case KOVA_ACTION_END:
-            return "up";
-        default:
-            return "?";
-    }
+    static const char* const names[] = {"down", "move", "up"};
+    return action <= KOVA_ACTION_END ? names[action] : "?";
 }
 
 std::vector<TouchEvent> builtin_gesture(const std::string& name, uint32_t hz, uint32_t w,
                                         uint32_t h) {
     std::vector<TouchEvent> ev;
-    const double cx = w / 2.0;
-    const double cy = h / 2.0;
+    const double cx = w / 2.0, cy = h / 2.0, pi = std::numbers::pi;
+    const auto stroke = [&](int64_t t0, int64_t ms, double swing, auto path) {
+        append_stroke(
+            ev, t0, ms, hz, [&](double s) { return path(ease(s, swing)); }, w, h);
+    };
+    // About 0.4 to 0.7 px/ms down the screen: a slow scroll. Every 8 ms step stays above the 3 px
+    // the engine needs to count a move.
+    const auto slow = [&](int64_t t0, int64_t ms) {
+        stroke(t0, ms, 0.25, [&](double u) {
+            return Point{cx - 60.0 + 120.0 * u + 40.0 * std::sin(2.0 * pi * u),
+                         cy - 450.0 + 900.0 * u};
+        });
+    };
+    // A flick of about 1400 px in 300 ms: from rest up to about 9 px/ms and back.
+    const auto fast = [&](int64_t t0) {
+        stroke(t0, 300, 0.8, [&](double u) {
+            return Point{cx - 300.0 + 600.0 * u, cy + 600.0 - 1300.0 * u};
+        });
+    };
     if (name == "slow") {
-        slow_stroke(ev, 0, 1600, hz, cx, cy, w, h);
+        slow(0, 1600);
     } else if (name == "fast") {
-        fast_stroke(ev, 0, hz, cx, cy, w, h);
+        fast(0);
     } else if (name == "strokes") {
-        // Three strokes with pauses between them: a sweep, a flick, a slow scroll.
-        medium_stroke(ev, 0, hz, cx, cy, w, h);
-        fast_stroke(ev, ev.back().time_ms + 500, hz, cx, cy, w, h);
-        slow_stroke(ev, ev.back().time_ms + 600, 1000, hz, cx, cy, w, h);
+        // Three strokes with pauses between them: a sweep of about 1.4 px/ms to the right along an
+        // arc, a flick, a slow scroll.
+        stroke(0, 600, 0.5, [&](double u) {
+            return Point{cx - 400.0 + 800.0 * u, cy + 200.0 - 300.0 * std::sin(pi * u)};
+        });
+        fast(ev.back().time_ms + 500);
+        slow(ev.back().time_ms + 600, 1000);
     }
     return ev;
 }
