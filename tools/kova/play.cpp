@@ -141,33 +141,16 @@ void wait_until(int64_t until, int64_t start, Status& status) {
 
 /* Leaves the process kSignalGraceMs after a signal if the command has not returned by then:
  * a device that never drains may block the stream's teardown. */
-class Watchdog {
-   public:
-    explicit Watchdog(Counts& counts) : counts_(counts), thread_([this] { watch(); }) {}
-    ~Watchdog() {
-        done_.store(true);
-        thread_.join();
-    }
+void start_watchdog(Counts& counts) {
+    std::thread([&counts] {
+        while (!g_signal.load()) sleep_ms(20);
+        sleep_ms(kSignalGraceMs);
+        counts.report(g_signal.load());
+        if (!counts.capture_temp.empty()) unlink(counts.capture_temp.c_str());
+        _exit(128 + g_signal.load());
+    }).detach();
+}
 
-   private:
-    void watch() {
-        int64_t since = 0;
-        while (!done_.load()) {
-            sleep_ms(20);
-            const int sig = g_signal.load();
-            if (!sig) continue;
-            if (!since) since = now_ms();
-            if (now_ms() - since < kSignalGraceMs) continue;
-            counts_.report(sig);
-            std::fflush(nullptr);
-            if (!counts_.capture_temp.empty()) unlink(counts_.capture_temp.c_str());
-            _exit(128 + sig);
-        }
-    }
-    Counts& counts_;
-    std::atomic<bool> done_{false};
-    std::thread thread_;
-};
 
 int run_play(PlayOptions& o) {
     SetupOptions& setup = o.setup;
@@ -175,7 +158,7 @@ int run_play(PlayOptions& o) {
     const KOVA_FORMAT fmt = setup.format.format();
     const std::vector<TouchEvent> events = load_gesture(o.gesture, fmt.w, fmt.h);
 
-    Counts counts;
+    static Counts counts; /* outlives this function: the watchdog may read it until the exit */
     counts.total_events = events.size();
     counts.capture = o.capture;
     counts.start_ms = now_ms();
@@ -184,7 +167,7 @@ int run_play(PlayOptions& o) {
     sa.sa_handler = on_signal;
     sigaction(SIGINT, &sa, nullptr);
     sigaction(SIGTERM, &sa, nullptr);
-    Watchdog watchdog(counts);
+    start_watchdog(counts);
 
     char why[256] = "";
     const bool has_device = kova_host_alsa_probe(o.device.c_str(), why, sizeof why) == 0;
@@ -192,13 +175,9 @@ int run_play(PlayOptions& o) {
     if (o.capture) {
         capture_file = std::make_unique<OutputFile>(*o.capture);
         counts.capture_temp = capture_file->temp_path();
-        if (!has_device) {
-            std::fprintf(info(), "no sound device (ALSA %s: %s); capturing the stream to %s\n",
-                         o.device.c_str(), why, o.capture->c_str());
-        } else {
-            std::fprintf(info(), "capturing the stream to %s (the sound device is not used)\n",
-                         o.capture->c_str());
-        }
+        if (!has_device)
+            std::fprintf(info(), "no sound device (ALSA %s: %s); ", o.device.c_str(), why);
+        std::fprintf(info(), "capturing the stream to %s\n", o.capture->c_str());
     } else if (!has_device) {
         failure("no sound device (ALSA " + in_quotes(o.device) + ": " + why +
                 "); use --capture FILE to write the stream to a WAV file");
