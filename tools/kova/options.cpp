@@ -66,10 +66,7 @@ bool parse_filter_type(const std::string& text, uint32_t& type) {
         {"bandreject", KOVA_FLT_BANDREJECT}, {"br", KOVA_FLT_BANDREJECT},
         {"notch", KOVA_FLT_BANDREJECT}};
     for (const auto& [name, code] : names) {
-        if (text == name) {
-            type = code;
-            return true;
-        }
+        if (text == name) return type = code, true;
     }
     return false;
 }
@@ -110,12 +107,9 @@ constexpr const char* kTuneGroup = "Tune set (each 0..1; unset values keep the s
 
 CLI::Option* add_level(CLI::App& app, const std::string& name, std::optional<double>& field,
                        const std::string& help, const std::string& group) {
-    return app
-        .add_option_function<double>(
-            name, [&field](const double& v) { field = v; }, help)
-        ->check(in_range(0, 1))
-        ->type_name("X")
-        ->group(group);
+    auto set = [&field](const double& v) { field = v; };
+    return shown(app.add_option_function<double>(name, set, help), "X", group)
+        ->check(in_range(0, 1));
 }
 
 /* The tune values each kind of set starts with, from the library's defaults and the built-in

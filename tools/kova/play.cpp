@@ -151,7 +151,6 @@ void start_watchdog(Counts& counts) {
     }).detach();
 }
 
-
 int run_play(PlayOptions& o) {
     SetupOptions& setup = o.setup;
     finish_setup(setup);

@@ -40,17 +40,16 @@ std::string format_name(int format, int mask, int command) {
 
 /* Interleaved frames of `in_ch` channels mixed to `out_ch`: each output channel is the mean of the
  * input channels that fall on it (c % out_ch), so mono is duplicated and stereo averaged. */
-template <typename T, typename Acc>
-std::vector<T> remix(const std::vector<T>& in, int in_ch, int out_ch) {
+std::vector<float> remix(const std::vector<float>& in, int in_ch, int out_ch) {
     if (in_ch == out_ch) return in;
     const size_t frames = in.size() / static_cast<size_t>(in_ch);
-    std::vector<T> out(frames * static_cast<size_t>(out_ch));
+    std::vector<float> out(frames * static_cast<size_t>(out_ch));
     for (size_t f = 0; f < frames; ++f) {
         for (int o = 0; o < out_ch; ++o) {
-            Acc sum = 0;
+            double sum = 0;
             int n = 0;
             for (int c = o % in_ch; c < in_ch; c += out_ch, ++n) sum += in[f * in_ch + c];
-            out[f * out_ch + o] = static_cast<T>(sum / n);
+            out[f * out_ch + o] = static_cast<float>(sum / n);
         }
     }
     return out;
@@ -86,36 +85,29 @@ std::vector<int16_t> read_sound(const std::string& path, int slot, const KOVA_FO
         const double ratio = static_cast<double>(rate) / info.samplerate;
         const size_t want = std::min<size_t>(
             frames_in_file, static_cast<size_t>(static_cast<double>(max_frames) / ratio) + 64);
-        if (exact) {
-            std::vector<int16_t> in(want * static_cast<size_t>(info.channels));
-            in.resize(static_cast<size_t>(
-                          sf_readf_short(snd.get(), in.data(), static_cast<sf_count_t>(want))) *
-                      static_cast<size_t>(info.channels));
-            pcm = remix<int16_t, int32_t>(in, info.channels, ch);
-        } else {
-            std::vector<float> in(want * static_cast<size_t>(info.channels));
-            in.resize(static_cast<size_t>(
-                          sf_readf_float(snd.get(), in.data(), static_cast<sf_count_t>(want))) *
-                      static_cast<size_t>(info.channels));
-            std::vector<float> mixed = remix<float, double>(in, info.channels, ch);
-            if (info.samplerate != rate) {
-                const size_t frames = mixed.size() / static_cast<size_t>(ch);
-                std::vector<float> resampled(
-                    (static_cast<size_t>(static_cast<double>(frames) * ratio) + 16) * ch);
-                SRC_DATA d{};
-                d.data_in = mixed.data();
-                d.input_frames = static_cast<long>(frames);
-                d.data_out = resampled.data();
-                d.output_frames = static_cast<long>(resampled.size() / static_cast<size_t>(ch));
-                d.src_ratio = ratio;
-                const int rc = src_simple(&d, SRC_SINC_BEST_QUALITY, ch);
-                if (rc != 0) file.fail(std::string("resampling failed: ") + src_strerror(rc));
-                resampled.resize(static_cast<size_t>(d.output_frames_gen) * ch);
-                mixed.swap(resampled);
-            }
-            pcm.resize(mixed.size());
-            src_float_to_short_array(mixed.data(), pcm.data(), static_cast<int>(mixed.size()));
+        // Through floats: 16-bit samples come back exactly (x / 32768, then x 32768 again).
+        std::vector<float> in(want * static_cast<size_t>(info.channels));
+        in.resize(static_cast<size_t>(
+                      sf_readf_float(snd.get(), in.data(), static_cast<sf_count_t>(want))) *
+                  static_cast<size_t>(info.channels));
+        std::vector<float> mixed = remix(in, info.channels, ch);
+        if (info.samplerate != rate) {
+            const size_t frames = mixed.size() / static_cast<size_t>(ch);
+            std::vector<float> resampled(
+                (static_cast<size_t>(static_cast<double>(frames) * ratio) + 16) * ch);
+            SRC_DATA d{};
+            d.data_in = mixed.data();
+            d.input_frames = static_cast<long>(frames);
+            d.data_out = resampled.data();
+            d.output_frames = static_cast<long>(resampled.size() / static_cast<size_t>(ch));
+            d.src_ratio = ratio;
+            const int rc = src_simple(&d, SRC_SINC_BEST_QUALITY, ch);
+            if (rc != 0) file.fail(std::string("resampling failed: ") + src_strerror(rc));
+            resampled.resize(static_cast<size_t>(d.output_frames_gen) * ch);
+            mixed.swap(resampled);
         }
+        pcm.resize(mixed.size());
+        src_float_to_short_array(mixed.data(), pcm.data(), static_cast<int>(mixed.size()));
         if (!exact || info.channels != ch) {
             note("converted " + what + " " + in_quotes(path) + " (" +
                  format_name(info.format, SF_FORMAT_TYPEMASK, SFC_GET_FORMAT_MAJOR) + ", " +
