@@ -107,16 +107,15 @@ void apply_pair(std::string_view name, std::string_view depth_name, const std::o
 
 void apply_tune(Engine& engine, int32_t id, const TuneOptions& t, const KOVA_TUNE_SET& base) {
     KOVA_TUNE_SET tune = base;
-    auto take = [](const std::optional<double>& v, double& field) {
-        if (v) field = *v;
-    };
-    take(t.gain, tune.gain);
-    take(t.pan, tune.pan);
-    take(t.wn_gain, tune.wn_gain);
-    take(t.file_gain, tune.file_gain);
-    take(t.start_gain, tune.start_gain);
-    take(t.loop_gain, tune.loop_gain);
-    take(t.end_gain, tune.end_gain);
+    const std::pair<const std::optional<double>&, double&> given[] = {
+        {t.gain, tune.gain},
+        {t.pan, tune.pan},
+        {t.wn_gain, tune.wn_gain},
+        {t.file_gain, tune.file_gain},
+        {t.start_gain, tune.start_gain},
+        {t.loop_gain, tune.loop_gain},
+        {t.end_gain, tune.end_gain}};
+    for (const auto& [value, field] : given) field = value.value_or(field);
     apply_pair("--osc", "--osc-depth", t.osc, t.osc_depth, tune.osc_enable, tune.osc_depth);
     apply_pair("--sharp", "--sharpness", t.sharp, t.sharpness, tune.sharp_enable, tune.sharpness);
     check(kova_set_tuneset(engine.ctx(), id, &tune), "setting the tune set");
