@@ -32,10 +32,11 @@ std::string describe(int rate, int channels, const std::string& samples) {
            (channels == 1 ? " channel" : " channels");
 }
 
-std::string format_name(int format, int mask, int command) {
+std::string format_name(int format) {
     SF_FORMAT_INFO fi{};
-    fi.format = format & mask;
-    return sf_command(nullptr, command, &fi, sizeof fi) == 0 && fi.name ? fi.name : "unknown";
+    fi.format = format;
+    return sf_command(nullptr, SFC_GET_FORMAT_INFO, &fi, sizeof fi) == 0 && fi.name ? fi.name
+                                                                                    : "unknown";
 }
 
 /* Interleaved frames of `in_ch` channels mixed to `out_ch`: each output channel is the mean of the
@@ -110,9 +111,9 @@ std::vector<int16_t> read_sound(const std::string& path, int slot, const KOVA_FO
         src_float_to_short_array(mixed.data(), pcm.data(), static_cast<int>(mixed.size()));
         if (!exact || info.channels != ch) {
             note("converted " + what + " " + in_quotes(path) + " (" +
-                 format_name(info.format, SF_FORMAT_TYPEMASK, SFC_GET_FORMAT_MAJOR) + ", " +
+                 format_name(info.format & SF_FORMAT_TYPEMASK) + ", " +
                  describe(info.samplerate, info.channels,
-                          format_name(info.format, SF_FORMAT_SUBMASK, SFC_GET_FORMAT_SUBTYPE)) +
+                          format_name(info.format & SF_FORMAT_SUBMASK)) +
                  ") to " + describe(rate, ch, "16-bit"));
         }
         frames_in_file = static_cast<size_t>(static_cast<double>(frames_in_file) * ratio);
