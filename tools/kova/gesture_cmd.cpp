@@ -36,9 +36,7 @@ int run_gesture(const GestureCommand& o) {
 Run add_gesture(CLI::App& app) {
     auto o = std::make_shared<GestureCommand>();
     CLI::App* sub = app.add_subcommand(
-        "gesture",
-        "Print a built-in gesture as CSV, the format that --gesture FILE reads: a starting "
-        "point for gestures of your own.");
+        "gesture", "print a built-in gesture as CSV, a start for gestures of your own");
     sub->add_option("name", o->gesture.gesture, "slow, fast or strokes (default strokes)")
         ->check(CLI::IsMember({"slow", "fast", "strokes"}))
         ->type_name("NAME");

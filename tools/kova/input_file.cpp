@@ -11,17 +11,13 @@
 #include "cli.h"
 
 namespace kova_tool {
-namespace {
-
-const char* kind(mode_t mode) {
+const char* file_kind(mode_t mode) {
     if (S_ISDIR(mode)) return "a folder";
     if (S_ISFIFO(mode)) return "a FIFO";
     if (S_ISCHR(mode) || S_ISBLK(mode)) return "a device";
     if (S_ISSOCK(mode)) return "a socket";
     return "not a file";
 }
-
-}  // namespace
 
 InputFile::InputFile(const std::string& path, const std::string& what) : path_(path), what_(what) {
     // O_NONBLOCK: opening a FIFO with no writer would otherwise wait for one.
@@ -30,7 +26,7 @@ InputFile::InputFile(const std::string& path, const std::string& what) : path_(p
     struct stat st {};
     if (fstat(fd_, &st) != 0) fail(std::strerror(errno));
     if (!S_ISREG(st.st_mode))
-        fail(std::string("it is ") + kind(st.st_mode) + ", not a regular file");
+        fail(std::string("it is ") + file_kind(st.st_mode) + ", not a regular file");
     fcntl(fd_, F_SETFL, fcntl(fd_, F_GETFL) & ~O_NONBLOCK);
     size_ = st.st_size;
 }

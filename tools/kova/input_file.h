@@ -2,6 +2,8 @@
 #ifndef KOVA_TOOL_INPUT_FILE_H
 #define KOVA_TOOL_INPUT_FILE_H
 
+#include <sys/types.h>
+
 #include <cstdint>
 #include <string>
 
@@ -10,6 +12,9 @@ namespace kova_tool {
 /* Owns a descriptor opened read-only on a regular file. A FIFO, device, socket or folder is
  * refused at once (opened without blocking, then checked), with one line naming `what` and
  * `path`: "cannot read gesture file 'x': it is a FIFO, not a regular file". */
+/* "a FIFO", "a device", "a folder", ... for messages about a file that is not a regular one. */
+const char* file_kind(mode_t mode);
+
 class InputFile {
    public:
     InputFile(const std::string& path, const std::string& what);

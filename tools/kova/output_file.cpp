@@ -11,6 +11,7 @@
 #include <vector>
 
 #include "cli.h"
+#include "input_file.h"
 
 namespace kova_tool {
 namespace {
@@ -41,9 +42,8 @@ OutputFile::OutputFile(std::string path) : path_(std::move(path)), target_(path_
             free(real);
         }
         if (stat(target_.c_str(), &st) == 0 && !S_ISREG(st.st_mode)) {
-            fail(S_ISDIR(st.st_mode)    ? "it is a folder"
-                 : S_ISFIFO(st.st_mode) ? "it is a FIFO, not a regular file (use -o - for a pipe)"
-                                        : "it is a device or socket, not a regular file");
+            fail(std::string("it is ") + file_kind(st.st_mode) + ", not a regular file" +
+                 (S_ISFIFO(st.st_mode) ? " (use -o - for a pipe)" : ""));
         }
         const size_t slash = target_.rfind('/');
         dir = slash == std::string::npos ? "" : target_.substr(0, slash + 1);

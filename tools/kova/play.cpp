@@ -264,12 +264,7 @@ int run_play(PlayOptions& o) {
 Run add_play(CLI::App& app) {
     auto o = std::make_shared<PlayOptions>();
     CLI::App* sub = app.add_subcommand(
-        "play",
-        "Play a gesture live: each event is generated at its own time and written to the "
-        "low-latency output stream, which plays it on the sound device (ALSA). On a terminal a "
-        "status line shows progress, the ring buffer's fill in ms, the blocks dropped because "
-        "the ring was full and the underruns while a stroke is held. Ctrl-C stops at once "
-        "(exit 130) and leaves a --capture file as it was.");
+        "play", "play a gesture live through the low-latency output stream (Ctrl-C: exit 130)");
     add_gesture_options(*sub, o->gesture);
     sub->add_option("--device", o->device, "ALSA playback device (default \"default\")")
         ->type_name("NAME")

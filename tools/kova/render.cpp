@@ -110,10 +110,7 @@ int run_render(RenderOptions& o) {
 Run add_render(CLI::App& app) {
     auto o = std::make_shared<RenderOptions>();
     CLI::App* sub = app.add_subcommand(
-        "render",
-        "Play a gesture through the engine into a WAV file (and a PNG picture). Blocks are queued "
-        "one after another, as the live stream plays them; a pause between strokes is silent up "
-        "to the next event's time.");
+        "render", "play a gesture through the engine into a WAV file (and a PNG picture)");
     add_gesture_options(*sub, o->gesture);
     sub->add_option("-o,--output", o->output,
                     "WAV file to write, - for standard output (default stroke.wav)")

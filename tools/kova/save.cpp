@@ -49,14 +49,8 @@ int run_save(SaveOptions& o) {
 
 Run add_save(CLI::App& app) {
     auto o = std::make_shared<SaveOptions>();
-    CLI::App* sub = app.add_subcommand(
-        "save",
-        "Build a source set and save it as a source-set file, which --set FILE (and the "
-        "library's kova_reg_src_bysavefile) registers again. The file keeps the sounds, filters, "
-        "tune set and repeat points, and the rate and channel count it was made for; thickness "
-        "and volume belong to the player and are not stored. An existing FILE is replaced whole. "
-        "A set whose loop is filtered noise gets file_gain = wn_gain unless --file-gain is "
-        "given, because a set read back from a file plays its loop at file_gain.");
+    CLI::App* sub =
+        app.add_subcommand("save", "build a source set and save it as a source-set file");
     sub->add_option("-o,--output", o->output, "the source-set file to write, - for standard output")
         ->required()
         ->type_name("FILE")

@@ -138,12 +138,8 @@ int run_inspect(const InspectOptions& o) {
 
 Run add_inspect(CLI::App& app) {
     auto o = std::make_shared<InspectOptions>();
-    CLI::App* sub = app.add_subcommand(
-        "inspect",
-        "Show what the library's file queries read from a saved source-set file: where each "
-        "slot's sound lies in the file and how long it is, its repeat points, the filters (one "
-        "per type) and the tune set as registering the file would read it (a noise level moves "
-        "to file_gain).");
+    CLI::App* sub =
+        app.add_subcommand("inspect", "show what a saved source-set file holds (--json for JSON)");
     sub->add_option("file", o->path, "the source-set file")->required()->type_name("FILE");
     sub->add_flag("--json", o->json, "print the same as one JSON object");
     return [o] { return run_inspect(*o); };
