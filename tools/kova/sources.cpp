@@ -170,24 +170,23 @@ PreparedSet prepare_set(Engine& engine, const SetupOptions& setup) {
     int32_t err = KOVA_OK;
     size_t first_attached = 0;
     bool replace_slots = false;
+    // Each call presets `err`; an id of 0 is a failure.
+    const auto need = [&err](int32_t id, const std::string& what) {
+        if (id == 0) failure("cannot " + what + ": " + library_error(err));
+        return id;
+    };
     if (src.builtin()) {
-        set.id = register_builtin_set(ctx, fmt, &err);
-        if (!set.id) failure("cannot register the built-in set: " + library_error(err));
+        set.id = need(register_builtin_set(ctx, fmt, &err), "register the built-in set");
         set.noise_loop = true;
     } else if (!src.set_path.empty()) {
-        set.id = kova_reg_src_bysavefile(ctx, src.set_path.c_str(), &err);
-        if (!set.id)
-            failure("cannot register source-set file " + in_quotes(src.set_path) + ": " +
-                    library_error(err));
+        set.id = need(kova_reg_src_bysavefile(ctx, src.set_path.c_str(), &err),
+                      "register source-set file " + in_quotes(src.set_path));
         replace_slots = paths.any;
     } else if (!src.slot[KOVA_SLOT_LOOP].empty()) {
-        set.id = kova_reg_src_byfiles(ctx, paths.ptr, &err);
-        if (!set.id) failure("cannot register the PCM files: " + library_error(err));
+        set.id = need(kova_reg_src_byfiles(ctx, paths.ptr, &err), "register the sound files");
     } else {
-        set.id = kova_reg_src_byfilter(ctx, &src.filters[0].dsc, &err);
-        if (!set.id)
-            failure("cannot register filter " + in_quotes(src.filters[0].text) + ": " +
-                    library_error(err));
+        set.id = need(kova_reg_src_byfilter(ctx, &src.filters[0].dsc, &err),
+                      "register filter " + in_quotes(src.filters[0].text));
         set.noise_loop = true;
         first_attached = 1;
         replace_slots = paths.any;
@@ -196,10 +195,8 @@ PreparedSet prepare_set(Engine& engine, const SetupOptions& setup) {
     KOVA_TUNE_SET base{};
     check(kova_get_tuneset(ctx, set.id, &base), "reading the tune set");
     if (replace_slots) {
-        err = KOVA_OK;
-        if (!kova_update_src_byfiles(ctx, set.id, paths.ptr, &err)) {
-            failure("cannot load the start/loop/end sounds: " + library_error(err));
-        }
+        need(kova_update_src_byfiles(ctx, set.id, paths.ptr, &err),
+             "load the start/loop/end sounds");
         if (paths.ptr[KOVA_SLOT_LOOP]) {
             // A new loop file takes the levels a file registration gives.
             set.noise_loop = false;
@@ -209,11 +206,8 @@ PreparedSet prepare_set(Engine& engine, const SetupOptions& setup) {
         // change how loud the loop plays.
     }
     for (size_t i = first_attached; i < src.filters.size(); ++i) {
-        err = KOVA_OK;
-        if (!kova_attach_filter(ctx, set.id, &src.filters[i].dsc, &err)) {
-            failure("cannot attach filter " + in_quotes(src.filters[i].text) + ": " +
-                    library_error(err));
-        }
+        need(kova_attach_filter(ctx, set.id, &src.filters[i].dsc, &err),
+             "attach filter " + in_quotes(src.filters[i].text));
     }
 
     check(kova_set_active_src(ctx, set.id), "selecting the source set");
