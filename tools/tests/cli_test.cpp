@@ -113,6 +113,9 @@ TEST(KovaCli, BadInputFilesFailWithExitOneAndKeepTheOutput) {
     write_file(dir.file("one.raw"), "x");
     write_file(dir.file("noise.bin"), "not a sound");
     ASSERT_EQ(mkfifo(dir.file("fifo").c_str(), 0600), 0);
+    write_file(dir.file("big.csv"), "");
+    ASSERT_EQ(truncate(dir.file("big.csv").c_str(), (64 << 20) + 1),
+              0);  // sparse, one byte too many
 
     struct Case {
         std::vector<std::string> args;
@@ -131,6 +134,7 @@ TEST(KovaCli, BadInputFilesFailWithExitOneAndKeepTheOutput) {
         {{"render", "--gesture", "/dev/zero", "-o", "out.wav"}, "device, not a regular file"},
         {{"render", "--gesture", "fifo", "-o", "out.wav"}, "FIFO, not a regular file"},
         {{"inspect", "fifo"}, "FIFO, not a regular file"},
+        {{"render", "--gesture", "big.csv", "-o", "out.wav"}, "more than the 67108864 accepted"},
         {{"render", "-o", "fifo"}, "FIFO, not a regular file"},
         {{"render", "--set", "noset.kset", "-o", "out.wav"}, "noset.kset"},
         {{"render", "--set", "bad.csv", "-o", "out.wav"}, "not a source-set file"},
@@ -145,7 +149,7 @@ TEST(KovaCli, BadInputFilesFailWithExitOneAndKeepTheOutput) {
         EXPECT_NE(r.err.find(c.mention), std::string::npos) << r.err;
         EXPECT_EQ(read_file(dir.file("out.wav")), keep);
     }
-    EXPECT_EQ(dir.list().size(), 7u) << "a failed command left a file behind";
+    EXPECT_EQ(dir.list().size(), 8u) << "a failed command left a file behind";
 }
 
 /* A link is written through to its target; "-" is standard output, with the report on stderr. */
