@@ -5,6 +5,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <regex>
 #include <sstream>
 
 #include "support/tool_run.h"
@@ -82,6 +83,20 @@ TEST(KovaPlay, WithoutDeviceOrCaptureFailsClearly) {
     EXPECT_EQ(count_lines(r.err), 1) << r.err;
     EXPECT_NE(r.err.find("no sound device"), std::string::npos) << r.err;
     EXPECT_NE(r.err.find("--capture"), std::string::npos) << r.err;
+}
+
+/* On a terminal the status line shows progress as a bar against the total, the ring's fill in ms,
+ * the blocks dropped and the underruns. */
+TEST(KovaPlay, StatusLineOnATerminal) {
+    TempDir dir;
+    const RunResult r =
+        run_kova({"play", "--gesture", "fast", "--device", kNoDevice, "--capture", "cap.wav"},
+                 dir.path(), 0, {}, true);
+    ASSERT_EQ(r.code, 0) << r.err;
+    const std::regex line(
+        R"(\[#{24}\] +[0-9.]+ / 0\.31 s   ring +[0-9]+ ms   dropped 0   underruns 0)");
+    EXPECT_TRUE(std::regex_search(r.err, line)) << r.err;
+    EXPECT_NE(r.err.find("] "), r.err.rfind("] ")) << "refreshed while it plays";
 }
 
 /* ALSA's "null" device takes samples and discards them; it exists wherever ALSA's configuration

@@ -46,7 +46,7 @@ int wait_child(pid_t pid, int64_t sigint_at, int64_t& exit_ms) {
 }  // namespace
 
 RunResult run_kova(const std::vector<std::string>& args, const std::string& dir,
-                   int sigint_after_ms, const std::vector<std::string>& env) {
+                   int sigint_after_ms, const std::vector<std::string>& env, bool stderr_tty) {
     const std::string out_path = dir + "/.stdout";
     const std::string err_path = dir + "/.stderr";
     std::vector<std::string> argv_store{KOVA_TOOL_BINARY};
@@ -59,7 +59,13 @@ RunResult run_kova(const std::vector<std::string>& args, const std::string& dir,
     posix_spawn_file_actions_init(&fa);
     posix_spawn_file_actions_addopen(&fa, 0, "/dev/null", O_RDONLY, 0);
     posix_spawn_file_actions_addopen(&fa, 1, out_path.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
-    posix_spawn_file_actions_addopen(&fa, 2, err_path.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
+    const int pty = stderr_tty ? posix_openpt(O_RDWR | O_NOCTTY) : -1;
+    if (pty >= 0 && grantpt(pty) == 0 && unlockpt(pty) == 0) {
+        posix_spawn_file_actions_addopen(&fa, 2, ptsname(pty), O_WRONLY | O_NOCTTY, 0);
+    } else {
+        posix_spawn_file_actions_addopen(&fa, 2, err_path.c_str(), O_WRONLY | O_CREAT | O_TRUNC,
+                                         0644);
+    }
     posix_spawn_file_actions_addchdir_np(&fa, dir.c_str());
     std::vector<std::string> env_store(env);
     for (char** e = environ; *e; ++e) env_store.emplace_back(*e);
@@ -79,6 +85,10 @@ RunResult run_kova(const std::vector<std::string>& args, const std::string& dir,
     if (WIFEXITED(status)) r.code = WEXITSTATUS(status);
     r.out = read_file(out_path);
     r.err = read_file(err_path);
+    // What the terminal got stays readable after the child closed its side.
+    char buf[4096];
+    for (ssize_t n; pty >= 0 && (n = read(pty, buf, sizeof buf)) > 0;) r.err.append(buf, n);
+    if (pty >= 0) close(pty);
     unlink(out_path.c_str());
     unlink(err_path.c_str());
     return r;

@@ -17,9 +17,10 @@ struct RunResult {
 
 /* Runs the kova binary with `args` in `dir`, standard input closed, with `env` ("NAME=value")
  * added to the environment. With `sigint_after_ms`, sends SIGINT that long after the start (and
- * SIGKILL 10 s later should it still run). */
+ * SIGKILL 10 s later should it still run). With `stderr_tty`, standard error is a terminal. */
 RunResult run_kova(const std::vector<std::string>& args, const std::string& dir,
-                   int sigint_after_ms = 0, const std::vector<std::string>& env = {});
+                   int sigint_after_ms = 0, const std::vector<std::string>& env = {},
+                   bool stderr_tty = false);
 
 /* A fresh folder under the system temporary folder, removed with its files. */
 class TempDir {
