@@ -67,7 +67,8 @@ struct TrackThread::State {
     const size_t burstBytes;
     std::unique_ptr<AudioSink> sink;
     std::vector<uint8_t> room;
-    android::AudioTrack::Buffer buffer{};  // outlives each callback: the callee may keep its address
+    // Outlives each callback: the callee may keep its address.
+    android::AudioTrack::Buffer buffer{};
 
     std::mutex lock;
     std::condition_variable wake;
