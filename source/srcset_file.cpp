@@ -6,7 +6,8 @@
 //  - a filter count above kMaxStoredFilters refuses the file (-3) before the set is touched; a
 //    negative count means no filters;
 //  - a descriptor read in part is appended with zeros where the file ended (it is cleared
-//    first); descriptors of a type of 4 or more, or for other than 1 or 2 channels, are dropped;
+//    first); descriptors of a type of 4 or more, or for more than kMaxStoredChannels channels,
+//    are dropped;
 //  - a tune set cut short keeps what the record held before where the file ends;
 //  - a source record read in part is used (cleared first); a stored size below 0 leaves the
 //    slot empty; a payload above the slot's limit (38400/192000/38400 bytes) is cut there and

@@ -36,7 +36,7 @@ int probe(const std::string& path, const Bytes& bytes, KOVA_SRCSET** keep = null
     EXPECT_LE(set->filters->count, 64u);
     for (NODE* n = set->filters->head->next; n != set->filters->tail; n = n->next) {
         const auto* d = static_cast<KOVA_FLT_DSC*>(n->data);
-        EXPECT_TRUE(d->type < 4 && (d->channels == 1 || d->channels == 2));
+        EXPECT_TRUE(d->type < 4 && d->channels <= 8);
     }
     for (int slot = 0; slot < 3; ++slot) {
         const KOVA_SRC* s = set->src[slot];
@@ -71,8 +71,8 @@ TEST(HostileFile, EveryTruncationReadsWhatIsThereAndNothingElse) {
         SCOPED_TRACE(len);
         KOVA_SRCSET* set = nullptr;
         ASSERT_EQ(probe(b.path, Bytes(b.file.begin(), b.file.begin() + len), &set), KOVA_OK);
-        // A descriptor cut short counts once its channel count (bytes 32..35) was read.
-        EXPECT_EQ(set->filters->count, len < 4 ? 0 : std::min<size_t>(2, (len + 3) / 40));
+        // A descriptor cut short counts (zeros where the file ended).
+        EXPECT_EQ(set->filters->count, len < 4 ? 0 : std::min<size_t>(2, (len + 35) / 40));
         // end_gain lies at 164..171; where the file ends the record keeps its earlier -7.
         EXPECT_TRUE((len > 164 && len < 172) || set->tune->end_gain == (len >= 172 ? 0.6 : -7));
         for (int slot = 0; slot < 3; ++slot) {
