@@ -33,8 +33,8 @@ inline uint8_t run_byte(size_t i, uint8_t seed) {
 // Fills dst[0..n) with `pattern` repeated, by doubling copies: the harness must not spend the
 // execution in a per-byte loop (under coverage tracing every comparison there is a call).
 __attribute__((no_sanitize("coverage"))) inline void fill_repeating(uint8_t* dst, size_t n,
-                                                                   const uint8_t* pattern,
-                                                                   size_t period) {
+                                                                    const uint8_t* pattern,
+                                                                    size_t period) {
     if (n == 0 || period == 0) return;
     size_t done = n < period ? n : period;
     std::memcpy(dst, pattern, done);
@@ -55,7 +55,8 @@ __attribute__((no_sanitize("coverage"))) inline std::vector<uint8_t> expand_file
     size_t at = 0;
     auto take = [&](size_t n) {
         uint32_t v = 0;
-        for (size_t k = 0; k < n && at < size; ++k) v |= static_cast<uint32_t>(data[at++]) << (8 * k);
+        for (size_t k = 0; k < n && at < size; ++k)
+            v |= static_cast<uint32_t>(data[at++]) << (8 * k);
         return v;
     };
     while (at < size && file.size() < kMaxFileBytes) {

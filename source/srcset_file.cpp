@@ -149,7 +149,8 @@ KOVA_API int kova_open_source(KOVA_SRCSET* set, const char* path) {
     TARQ_MFAL* m = file.mfal();
 
     int32_t count = 0;
-    if (_read_flt_size(h, m, &count) < 1) count = 0;  // read in part: zero high bytes
+    // A count read in part keeps zero high bytes.
+    if (_read_flt_size(h, m, &count) < 1) count = 0;
     if (count > kMaxStoredFilters) return KOVA_ERR_INVALID_PARAM;  // checked before any change
 
     for (int32_t i = 0; i < count; ++i) {
