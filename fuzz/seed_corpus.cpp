@@ -251,14 +251,8 @@ void generate_seeds() {
         generate_seed("fast-clipping", w);
     }
     {
-        ScriptWriter w;  // set management between strokes
-        w.header(7, false, true, 1080, 2280)
-            .u8(kova_fuzz::kSourceBoth)
-            .u16(800)
-            .u16(1000)
-            .u16(800)
-            .u8(90);
-        w.filter_record(KOVA_FLT_LOWPASS, 3000.0f, 1.0f, 1);
+        ScriptWriter w;  // set management between strokes (file sources: noise is costly)
+        w.header(7, false, true, 1080, 2280).files(800, 1000, 800, 90);
         stroke(w, 6, 10, 10, 16, kBuf3840);
         w.admin(kova_fuzz::kAdminSelect).u8(1);
         w.thickness(200);
