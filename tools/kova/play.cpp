@@ -233,6 +233,9 @@ int run_play(PlayOptions& o) {
         sleep_ms(10);
     }
     if (!g_signal.load()) sleep_ms(2 * kStatusPeriodMs);  // the device's own buffer
+    if (const uint32_t left = ring_fill(ft); left > 0 && !g_signal.load())
+        note("the device stopped taking sound; " +
+             std::to_string(static_cast<int>(left / bytes_per_ms)) + " ms never played");
     counts.stroke(false);
     status.show(now_ms() - start);
     status.finish();
