@@ -51,11 +51,9 @@ OutputFile::OutputFile(std::string path) : path_(std::move(path)), target_(path_
     const std::string base =
         to_stdout(path_) ? "kova-stdout" : target_.substr(target_.rfind('/') + 1);
     std::string tmpl = dir + "." + base + ".XXXXXX";
-    std::vector<char> buf(tmpl.begin(), tmpl.end());
-    buf.push_back('\0');
-    fd_ = mkstemp(buf.data());
+    fd_ = mkstemp(tmpl.data());
     if (fd_ < 0) fail(std::strerror(errno));
-    temp_ = buf.data();
+    temp_ = tmpl;
     // mkstemp creates the file for its owner only; the result gets the usual permissions.
     const mode_t mask = umask(0);
     umask(mask);

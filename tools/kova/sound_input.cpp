@@ -4,6 +4,7 @@
 #include <sndfile.h>
 
 #include <algorithm>
+#include <filesystem>
 #include <memory>
 
 #include "cli.h"
@@ -20,11 +21,8 @@ constexpr uint32_t kSlotMax[KOVA_SLOT_COUNT] = {KOVA_SLOT_START_MAX_BYTES, KOVA_
 constexpr uint32_t kMinLoopMs = 5;
 
 bool named_raw(const std::string& path) {
-    const size_t dot = path.rfind('.');
-    if (dot == std::string::npos || path.find('/', dot) != std::string::npos) return false;
-    std::string ext = path.substr(dot + 1);
-    for (char& c : ext) c = static_cast<char>(std::tolower(static_cast<unsigned char>(c)));
-    return ext == "raw" || ext == "pcm";
+    const std::string ext = CLI::detail::to_lower(std::filesystem::path(path).extension());
+    return ext == ".raw" || ext == ".pcm";
 }
 
 std::string describe(int rate, int channels, const std::string& samples) {
