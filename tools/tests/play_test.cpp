@@ -5,7 +5,6 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <regex>
 #include <sstream>
 
 #include "support/tool_run.h"
@@ -93,9 +92,9 @@ TEST(KovaPlay, StatusLineOnATerminal) {
         run_kova({"play", "--gesture", "fast", "--device", kNoDevice, "--capture", "cap.wav"},
                  dir.path(), 0, {}, true);
     ASSERT_EQ(r.code, 0) << r.err;
-    const std::regex line(
-        R"(\[#{24}\] +[0-9.]+ / 0\.31 s   ring +[0-9]+ ms   dropped 0   underruns 0)");
-    EXPECT_TRUE(std::regex_search(r.err, line)) << r.err;
+    for (const std::string part :
+         {"[" + std::string(24, '#') + "] ", " / 0.31 s   ring ", " ms   dropped 0   underruns 0"})
+        EXPECT_NE(r.err.find(part), std::string::npos) << r.err;
     EXPECT_NE(r.err.find("] "), r.err.rfind("] ")) << "refreshed while it plays";
 }
 
