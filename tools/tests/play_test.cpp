@@ -92,8 +92,9 @@ TEST(KovaPlay, StatusLineOnATerminal) {
         run_kova({"play", "--gesture", "fast", "--device", kNoDevice, "--capture", "cap.wav"},
                  dir.path(), 0, {}, true);
     ASSERT_EQ(r.code, 0) << r.err;
-    for (const std::string part :
-         {"[" + std::string(24, '#') + "] ", " / 0.31 s   ring ", " ms   dropped 0   underruns 0"})
+    for (const std::string& part :
+         std::vector<std::string>{"[" + std::string(24, '#') + "] ", " / 0.31 s   ring ",
+                                  " ms   dropped 0   underruns 0"})
         EXPECT_NE(r.err.find(part), std::string::npos) << r.err;
     EXPECT_NE(r.err.find("] "), r.err.rfind("] ")) << "refreshed while it plays";
 }
