@@ -20,7 +20,8 @@ void write_wav(OutputFile& file, const std::vector<int16_t>& pcm, uint32_t rate,
     const sf_count_t written = sf_writef_short(snd, pcm.data(), frames);
     const std::string error = written == frames ? "" : sf_strerror(snd);
     if (sf_close(snd) != 0 || !error.empty()) {
-        failure("cannot write " + in_quotes(path) + ": " + (error.empty() ? "close failed" : error));
+        failure("cannot write " + in_quotes(path) + ": " +
+                (error.empty() ? "close failed" : error));
     }
 }
 
