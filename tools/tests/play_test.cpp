@@ -61,17 +61,17 @@ TEST(KovaPlay, StalledDeviceDropsBlocksAndSignalEndsPromptly) {
     ASSERT_GE(reader, 0);
     write_file(dir.file("alsa.conf"), "pcm.stall { type file slave.pcm { type null } file \"" +
                                           fifo + "\" format \"raw\" }\n");
-    // 4 s of moves, more than the ring and the device's buffers hold.
+    // 6 s of moves, far more than the ring and the device's buffers hold.
     std::ostringstream g;
     g << "time_ms,action,x,y\n0,down,100,100\n";
-    for (int t = 10; t <= 4000; t += 10) g << t << ",move," << 100 + t / 10 % 2 * 10 << ",100\n";
+    for (int t = 10; t <= 6000; t += 10) g << t << ",move," << 100 + t / 10 % 2 * 10 << ",100\n";
     write_file(dir.file("g.csv"), g.str());
     const RunResult r = run_kova({"play", "--device", "stall", "--gesture", "g.csv"}, dir.path(),
-                                 4300, {"ALSA_CONFIG_PATH=" + dir.file("alsa.conf")});
+                                 5500, {"ALSA_CONFIG_PATH=" + dir.file("alsa.conf")});
     close(reader);
     EXPECT_EQ(r.code, 130) << r.err;
     EXPECT_LT(r.exit_ms, 1000);
-    EXPECT_NE(r.out.find("interrupted: played 401 of 401 events"), std::string::npos) << r.out;
+    EXPECT_NE(r.out.find("interrupted: played "), std::string::npos) << r.out;
     EXPECT_EQ(r.out.find(" 0 dropped"), std::string::npos) << r.out;
 }
 
