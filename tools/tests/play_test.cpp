@@ -41,7 +41,7 @@ TEST(KovaPlay, CaptureHoldsEveryBlockWithoutADevice) {
     const std::string before = read_file(dir.file("cap.wav"));
     const RunResult c =
         run_kova({"play", "--gesture", "slow", "--device", kNoDevice, "--capture", "cap.wav"},
-                 dir.path(), 400);
+                 dir.path(), 1000);
     EXPECT_EQ(c.code, 130) << c.err;
     EXPECT_EQ(read_file(dir.file("cap.wav")), before);
     EXPECT_EQ(dir.list().size(), 2u) << "a temporary file was left behind";
