@@ -25,17 +25,21 @@ constexpr int32_t slot_max_bytes(int slot) {
 }
 constexpr int32_t kLargestSlotBytes = KOVA_SLOT_LOOP_MAX_BYTES;
 
-// The engine keeps at most one descriptor per filter type (4). A stored count above this is not
-// a file the library wrote: the reader and the queries refuse such a file instead of looping
-// over billions of records.
+// The set reader's bound on a stored filter count: each descriptor is an allocation and each
+// enabled filter runs over every payload, so a count of billions would allocate and work without
+// bound. A file above it is refused. (The queries only read descriptors and follow any count.)
 constexpr int32_t kMaxStoredFilters = 64;
 
-// A stored descriptor is taken only with a filter type code and a channel count of 1 or 2, the
-// only counts an engine runs with: a filter keeps state per channel, so a hostile count would
-// make it allocate gigabytes. Other fields are used as stored; the filter design copes with
-// degenerate frequencies.
+// The set reader's bound on a stored channel count: a filter keeps state per channel, so a huge
+// count would allocate without bound. Counts up to it, 0 and negative ones included, are safe
+// (the filter processes 1 to 8 channels and skips counts below 1).
+constexpr int32_t kMaxStoredChannels = 8;
+
+// A stored descriptor is taken unless its type indexes past the per-type tables or its channel
+// count is above kMaxStoredChannels. Other fields are used as stored; the filter design copes
+// with degenerate frequencies.
 inline bool stored_filter_usable(const KOVA_FLT_DSC& dsc) {
-    return dsc.type < KOVA_FLT_TYPE_COUNT && dsc.channels >= 1 && dsc.channels <= 2;
+    return dsc.type < KOVA_FLT_TYPE_COUNT && dsc.channels <= kMaxStoredChannels;
 }
 
 // Sizes of the records in a source-set file.
