@@ -75,7 +75,12 @@ class Session {
             ev.x = last_.x + in.take<int16_t>();
             ev.y = last_.y + in.take<int16_t>();
         }
-        ev.time = (flags & kEvRawTime) ? in.take<int64_t>() : last_.time + in.take<uint8_t>();
+        // A step after a raw time near INT64_MAX wraps (as the engine's time difference does)
+        // instead of overflowing here.
+        const auto step = [&] {
+            return static_cast<int64_t>(static_cast<uint64_t>(last_.time) + in.take<uint8_t>());
+        };
+        ev.time = (flags & kEvRawTime) ? in.take<int64_t>() : step();
         const auto sel = in.take<uint8_t>();
         int32_t size = decode_buffer_size(sel, sel >= 0xF0 ? in.take<uint32_t>() : 0);
         // Once an input has generated kOutputBudget bytes, its further buffers hold 512 bytes
@@ -184,7 +189,7 @@ class Session {
     bool costly() { return costly_left_-- > 0; }
 
    private:
-    static constexpr int64_t kOutputBudget = 512 * 1024;
+    static constexpr int64_t kOutputBudget = 32 * 1024;
     static constexpr int32_t kCappedBuffer = 512;
     int64_t output_left_ = kOutputBudget;
     int costly_left_ = 2;
