@@ -45,6 +45,16 @@ constexpr int kTuneSetBytes = 88;
 constexpr int kSrcInfoBytes = 20;
 constexpr int kSrcRecordBytes = 48;
 
+// Offsets of the fields of a stored source record: the image of KOVA_SRC on a 64-bit target
+// (three 8-byte reference words, then six 32-bit fields). Fixed numbers rather than offsetof, so
+// a 32-bit build reads and writes the same files.
+constexpr size_t kSrcSizeAt = 24;
+constexpr size_t kSrcPosAt = 28;
+constexpr size_t kSrcSlotAt = 32;
+constexpr size_t kSrcOriginAt = 36;
+constexpr size_t kSrcRptStartAt = 40;
+constexpr size_t kSrcRptEndAt = 44;
+
 // Reads a field of a stored record image at its byte offset.
 template <typename T>
 T load(const unsigned char* image, size_t offset) {
