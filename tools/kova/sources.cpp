@@ -13,6 +13,7 @@
 #include <memory>
 #include <vector>
 
+#include "builtin_set.h"
 #include "builtin_sounds.h"
 #include "savefile_check.h"
 
@@ -21,11 +22,6 @@ namespace {
 
 constexpr uint32_t kSlotMax[KOVA_SLOT_COUNT] = {KOVA_SLOT_START_MAX_BYTES, KOVA_SLOT_LOOP_MAX_BYTES,
                                                 KOVA_SLOT_END_MAX_BYTES};
-
-/* The built-in loop: white noise through a band-pass from about 1 to 4 kHz, the scratch of a pen
- * on paper. */
-constexpr double kBuiltinFilterHz = 2500.0;
-constexpr double kBuiltinFilterBandHz = 3000.0;
 
 /* A private folder for the built-in start and end sounds while the set is built: the engine
  * registers sounds from files only. Removed with everything in it when the set is done. */
@@ -227,29 +223,9 @@ std::string library_error(int32_t code) {
     return std::string(what) + " (library code " + std::to_string(code) + ")";
 }
 
-KOVA_FLT_DSC builtin_filter(const KOVA_FORMAT& format) {
-    KOVA_FLT_DSC d{};
-    d.type = KOVA_FLT_BANDPASS;
-    // Below 8 kHz of Nyquist the band is pulled down with it, so low rates still get a band.
-    d.freq = std::min(kBuiltinFilterHz, format.sample_rate * 0.25);
-    d.bandwidth = std::min(kBuiltinFilterBandHz, format.sample_rate * 0.3);
-    d.enable = 1;
-    d.samplerate = static_cast<int32_t>(format.sample_rate);
-    d.channels = static_cast<int32_t>(format.channels);
-    return d;
-}
-
 PreparedSet prepare_set(Engine& engine, const SetupOptions& setup) {
     const KOVA_FORMAT& fmt = engine.format();
-    SourceOptions src = setup.source;
-    if (src.builtin()) {
-        FilterArg f;
-        f.text = "builtin";
-        f.dsc = builtin_filter(fmt);
-        src.filters.push_back(f);
-        src.slot[KOVA_SLOT_START] = std::string(kBuiltinSound);
-        src.slot[KOVA_SLOT_END] = std::string(kBuiltinSound);
-    }
+    const SourceOptions& src = setup.source;
     if (!src.set_path.empty()) {
         const SavedFormat saved =
             check_source_set_file(src.set_path, src.slot[KOVA_SLOT_LOOP].empty());
@@ -273,7 +249,11 @@ PreparedSet prepare_set(Engine& engine, const SetupOptions& setup) {
     int32_t err = KOVA_OK;
     size_t first_attached = 0;
     bool replace_slots = false;
-    if (!src.set_path.empty()) {
+    if (src.builtin()) {
+        set.id = register_builtin_set(ctx, fmt, &err);
+        if (!set.id) failure("cannot register the built-in set: " + library_error(err));
+        set.noise_loop = true;
+    } else if (!src.set_path.empty()) {
         set.id = kova_reg_src_bysavefile(ctx, src.set_path.c_str(), &err);
         if (!set.id)
             failure("cannot register source-set file " + quoted(src.set_path) + ": " +
