@@ -16,6 +16,8 @@ site=$out/site
 export NODE_PATH=/usr/share/nodejs${NODE_PATH:+:$NODE_PATH}
 python=/usr/bin/python3 # Debian's, with python3-selenium
 
+scripts/setup.sh
+
 build() {
     echo "== studio: WebAssembly build"
     emcmake cmake -S studio -B "$out/wasm" -DCMAKE_BUILD_TYPE=Release >"$out.wasm.log" 2>&1 ||
@@ -37,13 +39,13 @@ case "$mode" in
     build
     echo "== studio: native library for the reference"
     cmake -S . -B "$out/native" -DCMAKE_BUILD_TYPE=RelWithDebInfo -DKOVA_BUILD_TESTS=OFF \
-        -DKOVA_BUILD_TOOLS=OFF -DKOVA_BUILD_BENCH=OFF -DKOVA_BUILD_JAVA=OFF >"$out.native.log" 2>&1 ||
+        -DKOVA_BUILD_TOOLS=ON -DKOVA_BUILD_BENCH=OFF -DKOVA_BUILD_JAVA=OFF >"$out.native.log" 2>&1 ||
         { tail -n 40 "$out.native.log"; exit 1; }
-    cmake --build "$out/native" -j "$jobs" --target KovaFastTrack >>"$out.native.log" 2>&1 ||
+    cmake --build "$out/native" -j "$jobs" --target KovaFastTrack kova >>"$out.native.log" 2>&1 ||
         { tail -n 40 "$out.native.log"; exit 1; }
     echo "== studio: browser tests (headless Chromium)"
-    "$python" studio/tests/browser_test.py --site "$site" --library "$out/native/libKovaFastTrack.so" \
-        --artifacts "$out/test"
+    "$python" studio/tests/browser_test.py --site "$site" --artifacts "$out/test" \
+        --library "$out/native/libKovaFastTrack.so" --kova "$out/native/tools/kova"
     ;;
 serve)
     mkdir -p "$out"

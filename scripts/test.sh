@@ -8,10 +8,12 @@
 #   5. libFuzzer targets (clang): seed corpora made by the library, replay of seeds and saved
 #      regressions, then a bounded fuzzing run per target;
 #   6. AArch64 cross build, its tests under qemu-user, and the source-set file exchange between
-#      x86-64 and AArch64 (scripts/aarch64.sh).
+#      x86-64 and AArch64 (scripts/aarch64.sh);
+#   7. the browser studio: the engine built to WebAssembly and its page tested in headless
+#      Chromium against the native library (scripts/studio.sh --test).
 # Environment: KOVA_JOBS (parallel jobs), KOVA_SOAK_SECONDS (default 20), KOVA_FUZZ_SECONDS
 # (per target, default 60), KOVA_SKIP (space-separated stage names to skip: valgrind soak tsan
-# fuzz aarch64).
+# fuzz aarch64 studio).
 set -euo pipefail
 root=$(cd "$(dirname "$0")/.." && pwd)
 cd "$root"
@@ -125,6 +127,11 @@ fi
 if ! skipped aarch64; then
     scripts/aarch64.sh build
     stage_done "aarch64 cross build + qemu tests"
+fi
+
+if ! skipped studio; then
+    KOVA_JOBS=$jobs scripts/studio.sh --test
+    stage_done "studio wasm build + browser tests"
 fi
 
 echo "== stage times"

@@ -50,6 +50,7 @@ export class KovaEngine {
         this.paths = M._malloc(3 * 4 + 3 * 64);
         this.pcm = M._malloc(PCM_BYTES);
         this.pcmbuf = M._malloc(8);
+        this.sounds = 0; // dropped sounds written so far
         M.FS.mkdirTree("/studio");
     }
 
@@ -155,24 +156,26 @@ export class KovaEngine {
         if (code !== 0) throw new KovaError(what, code);
     }
 
+    // Replaces the slots given (others null). Each sound stays in its own file of the in-memory
+    // file system: the engine reads file sources again whenever the set's filters change.
     replaceSlots(ctx, id, slots) {
         if (!slots.some(Boolean)) return;
         const v = this.dv();
-        const names = [];
         slots.forEach((s, i) => {
             let ptr = 0;
             if (s) {
-                const path = `/studio/slot-${i}.pcm`;
-                this.M.FS.writeFile(path, new Uint8Array(s.pcm.buffer, s.pcm.byteOffset, s.pcm.byteLength));
-                names.push(path);
-                ptr = this.cstr(path, this.paths + 12 + 64 * i);
+                if (!s.path) {
+                    s.path = `/studio/sound-${++this.sounds}.pcm`;
+                    this.M.FS.writeFile(s.path, new Uint8Array(s.pcm.buffer, s.pcm.byteOffset, s.pcm.byteLength));
+                }
+                ptr = this.cstr(s.path, this.paths + 12 + 64 * i);
             }
             v.setUint32(this.paths + 4 * i, ptr, true);
         });
         const levels = this.getTune(ctx, id);
-        const ok = this.M._kova_update_src_byfiles(ctx, id, this.paths, this.err);
-        names.forEach((p) => this.M.FS.unlink(p));
-        if (!ok) throw new KovaError("cannot load the dropped sounds", this.errCode());
+        if (!this.M._kova_update_src_byfiles(ctx, id, this.paths, this.err)) {
+            throw new KovaError("cannot load the dropped sounds", this.errCode());
+        }
         // A new loop takes the levels of a file registration; new start or end sounds alone do
         // not change how loud the loop plays.
         if (!slots[1]) this.setTune(ctx, id, levels);

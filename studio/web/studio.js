@@ -444,6 +444,9 @@ async function dropped(file, target) {
         say(`${file.name} is now the ${SLOTS[slot]} sound`);
     } catch (e) {
         say(e instanceof KovaError ? e.message : `cannot use ${file.name}: ${e.message || e}`, "error");
+        // The engine empties a slot whose new file it cannot read: the live set is built again
+        // from the unchanged design.
+        attempt(() => rebuild(studio.format, studio.design));
     }
 }
 
