@@ -33,8 +33,8 @@ extern "C" int32_t studio_register_builtin(KOVA_CTX* ctx, int32_t* err) {
     const int32_t id = kova_tool::register_builtin_set(ctx, fmt, err);
     if (id == 0) return 0;
 
-    const std::string stem = "/studio/builtin-" + std::to_string(fmt.sample_rate) + "-" +
-                             std::to_string(fmt.channels);
+    const std::string stem =
+        "/studio/builtin-" + std::to_string(fmt.sample_rate) + "-" + std::to_string(fmt.channels);
     const std::string start = stem + "-start.pcm";
     const std::string end = stem + "-end.pcm";
     if (!write_pcm(start, kova_tool::builtin_start_sound(fmt.sample_rate, fmt.channels,

@@ -36,7 +36,7 @@ function say(text, kind = "info") {
     li.textContent = text;
     const list = $("messages");
     list.prepend(li);
-    while (list.children.length > 6) list.lastChild.remove();
+    while (list.children.length > 4) list.lastChild.remove();
     (kind === "error" ? console.warn : console.log)(`studio: ${text}`);
 }
 
@@ -86,8 +86,11 @@ function fitPad() {
     pad.width = Math.floor(cw * devicePixelRatio);
     pad.height = Math.floor(ch * devicePixelRatio);
     const strip = $("strip");
-    strip.width = Math.floor(strip.clientWidth);
-    strip.height = Math.floor(strip.clientHeight);
+    if (strip.width !== Math.floor(strip.clientWidth) || strip.height !== Math.floor(strip.clientHeight)) {
+        strip.width = Math.floor(strip.clientWidth);
+        strip.height = Math.floor(strip.clientHeight);
+        studio.strip?.clear();
+    }
 }
 
 // Screen pixels of the engine's screen for a pointer position (a format without a screen size
@@ -310,6 +313,13 @@ function refreshControls() {
     $("f-panning").checked = f.panning === 1;
     $("f-width").value = f.width;
     $("f-height").value = f.height;
+    for (const zone of document.querySelectorAll(".drop[data-target]")) {
+        const slot = Number(zone.dataset.target);
+        if (Number.isNaN(slot)) continue;
+        let note = zone.querySelector("small");
+        if (!note) zone.append((note = document.createElement("small")));
+        note.textContent = studio.design.slots[slot]?.name ?? "the set's own sound (drop a file to replace it)";
+    }
     const base = studio.design.base;
     $("status").textContent = `${base.kind === "builtin" ? "built-in set" : base.name} · ${f.rate} Hz, ` +
         `${f.channels} channel${f.channels > 1 ? "s" : ""}${f.panning === 1 ? ", panning" : ""}, ${f.width} × ${f.height}`;
@@ -323,8 +333,8 @@ async function applyFormat() {
         panning: $("f-panning").checked ? 1 : 0,
         width: Number($("f-width").value) >>> 0, height: Number($("f-height").value) >>> 0,
     };
-    const code = studio.engine.checkFormat(f);
-    if (code !== 0) {
+    const code = studio.engine.checkFormat(f); // 1 accepted, -1 refused
+    if (code < 1) {
         const why = f.panning === 1 && f.channels !== 2 ? "panning needs 2 channels"
             : f.panning === 1 ? "panning needs a screen size" : "rate 8000..48000 Hz, 1 or 2 channels";
         say(`format refused: ${libraryError(code)}; ${why}`, "error");
@@ -336,6 +346,16 @@ async function applyFormat() {
     for (const [t, flt] of Object.entries(studio.design.filters)) {
         if (flt.freq < f.rate / 2 && (Number(t) < 2 || flt.bandwidth < f.rate / 2)) design.filters[t] = flt;
         else say(`the ${FILTER_TYPES[t]} filter does not fit under ${f.rate / 2} Hz and was left out`, "note");
+    }
+    // Dropped sounds are converted again from their files for the new format.
+    design.slots = [];
+    for (const [i, s] of studio.design.slots.entries()) {
+        try {
+            design.slots.push(s && { name: s.name, bytes: s.bytes, pcm: await soundToPcm({ name: s.name }, s.bytes, i, f) });
+        } catch (e) {
+            say(`${e.message}; the format stays as it was`, "error");
+            return;
+        }
     }
     if (attempt(() => rebuild(f, design)) === undefined) return;
     await studio.audio.open(f.rate, f.channels);
@@ -387,8 +407,8 @@ function openSet(bytes, name) {
 }
 
 // Decodes a dropped sound into the engine's format: 16-bit interleaved at its rate and channels.
-async function soundToPcm(file, bytes, slot) {
-    const { rate, channels } = studio.format;
+async function soundToPcm(file, bytes, slot, format = studio.format) {
+    const { rate, channels } = format;
     if (!bytes.length) throw new KovaError(`${file.name} is empty`);
     let pcm;
     if (/\.(raw|pcm|s16)$/i.test(file.name)) {
@@ -435,7 +455,7 @@ async function dropped(file, target) {
     try {
         const pcm = await soundToPcm(file, bytes, slot);
         const slots = [null, null, null];
-        slots[slot] = { name: file.name, pcm };
+        slots[slot] = { name: file.name, bytes, pcm };
         studio.engine.replaceSlots(studio.ctx, studio.setId, slots);
         studio.design.slots[slot] = slots[slot];
         // The new sound may change the set's levels (a new loop plays at the file level).

@@ -8,8 +8,14 @@ export class PlayedStrip {
     constructor(canvas) {
         this.canvas = canvas;
         this.g = canvas.getContext("2d");
+        this.clear();
         this.time = null;
         this.freq = null;
+    }
+
+    clear() {
+        this.g.fillStyle = "#101418";
+        this.g.fillRect(0, 0, this.canvas.width, this.canvas.height);
     }
 
     // One column per animation frame from the analyser after the worklet.
