@@ -54,6 +54,14 @@ constexpr size_t kSrcSlotAt = 32;
 constexpr size_t kSrcOriginAt = 36;
 constexpr size_t kSrcRptStartAt = 40;
 constexpr size_t kSrcRptEndAt = 44;
+#if UINTPTR_MAX > 0xFFFFFFFFu
+static_assert(offsetof(KOVA_SRC, size) == kSrcSizeAt && offsetof(KOVA_SRC, pos) == kSrcPosAt &&
+                  offsetof(KOVA_SRC, slot) == kSrcSlotAt &&
+                  offsetof(KOVA_SRC, origin) == kSrcOriginAt &&
+                  offsetof(KOVA_SRC, rpt_start) == kSrcRptStartAt &&
+                  offsetof(KOVA_SRC, rpt_end) == kSrcRptEndAt,
+              "a 64-bit KOVA_SRC is the stored record's image");
+#endif
 
 // Reads a field of a stored record image at its byte offset.
 template <typename T>
