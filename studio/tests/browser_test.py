@@ -2,7 +2,8 @@
 
 1. generate() equals the native library's bytes for the same saved set and events;
 2. a stroke drawn with real pointer events reaches the worklet as sound;
-3. a set saved from the page (its download) registers natively and sounds the same;
+3. the page's built-in set is the tool's; a set saved from the page (its download) registers
+   natively and sounds the same, and the page shows what `kova inspect` shows of it;
 4. a bad file dropped or loaded gives a clear message and leaves the design intact;
 5. screenshots at desktop and phone size, with the page laid out to fit.
 """
@@ -279,6 +280,10 @@ def test_saved_set_sounds_the_same_natively(page, native, kova, work):
     assert data != page_builtin, "the edits did not reach the saved set"
     # A filter change reloads file sources: the start and end sounds must survive it.
     assert slots_present(data) == [1, 1, 1], f"slots lost after a filter edit: {slots_present(data)}"
+    # The page shows what `kova inspect` shows of the file.
+    shown = page.d.find_element(By.ID, "inspect").get_attribute("textContent").splitlines()
+    told = subprocess.run([kova, "inspect", saved], check=True, capture_output=True, text=True).stdout.splitlines()
+    assert shown[1:] == told[1:], f"the page's view of the file differs from `kova inspect`: {shown} vs {told}"
     events = stroke(t0=5000, x0=800.0, y0=1500.0)
     want = native.render(saved, events)
     got = page.generate(events)

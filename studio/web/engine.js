@@ -143,6 +143,7 @@ export class KovaEngine {
         for (const [type, f] of Object.entries(design.filters)) {
             this.attachFilter(ctx, id, format, Number(type), f);
         }
+        if (design.repeat) this.setRepeat(ctx, id, design.repeat);
         this.check(M._kova_set_active_src(ctx, id), "selecting the set");
         if (design.tune) this.setTune(ctx, id, design.tune);
         if (design.thickness !== null) {
@@ -204,6 +205,34 @@ export class KovaEngine {
             else v.setFloat64(p + off, t[name], true);
         }
         this.M._kova_set_tuneset(ctx, id, p);
+    }
+
+    // ---- repeat points ----------------------------------------------------------------------
+
+    // {len, start, end}: per slot, in milliseconds (-1 for an empty slot).
+    getRepeat(ctx, id) {
+        const p = this.scratch;
+        this.M.HEAPU8.fill(0, p, p + 48);
+        this.check(this.M._kova_get_rptinfo(ctx, id, p), "reading the repeat points");
+        const v = this.dv();
+        const at = (off, i, wide) => (wide ? Number(v.getBigInt64(p + off + 8 * i, true)) : v.getInt32(p + off + 4 * i, true));
+        return {
+            len: [0, 1, 2].map((i) => at(0, i, true)),
+            start: [0, 1, 2].map((i) => at(24, i)),
+            end: [0, 1, 2].map((i) => at(36, i)),
+        };
+    }
+
+    // Stores start and end values (-1 keeps a value; the engine skips values out of range).
+    setRepeat(ctx, id, r) {
+        const p = this.scratch;
+        const v = this.dv();
+        this.M.HEAPU8.fill(0, p, p + 48);
+        for (let i = 0; i < 3; ++i) {
+            v.setInt32(p + 24 + 4 * i, r.start[i], true);
+            v.setInt32(p + 36 + 4 * i, r.end[i], true);
+        }
+        this.check(this.M._kova_set_rptinfo(ctx, id, p), "setting the repeat points");
     }
 
     // ---- filters ---------------------------------------------------------------------------

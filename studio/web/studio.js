@@ -14,7 +14,7 @@ const ACTIONS = { down: 0, move: 1, up: 2 };
 // Everything that makes the set, so it can be built again in a fresh context (a new format, a
 // reproducible render): the base, then dropped sounds, filters, tune set, thickness, volume.
 function newDesign(base = { kind: "builtin" }) {
-    return { base, slots: [null, null, null], filters: {}, tune: null, thickness: null, volume: null };
+    return { base, slots: [null, null, null], filters: {}, repeat: null, tune: null, thickness: null, volume: null };
 }
 
 const studio = {
@@ -186,7 +186,7 @@ function slider(parent, label, { min, max, step, value, log = false, unit = "" }
     input.max = log ? 1 : max;
     input.step = log ? 0.001 : step;
     const out = document.createElement("output");
-    const show = (v) => { out.textContent = `${log ? Math.round(v) : v.toFixed(2)}${unit}`; };
+    const show = (v) => { out.textContent = `${log || step >= 1 ? Math.round(v) : v.toFixed(2)}${unit}`; };
     const set = (v) => { input.value = toPos(v); show(v); };
     set(value);
     input.addEventListener("input", () => show(fromPos(Number(input.value))));
@@ -249,6 +249,15 @@ function buildTuneControls() {
         slider(box, TUNE_LABELS[field], { min: 0, max: 1, step: 0.01, value: t[field] }, (v) => changeTune(field, v));
     }
     const d = studio.design;
+    // Only the loop's repeat end shapes playback: the loop plays up to it, then from its middle.
+    const rpt = studio.engine.getRepeat(studio.ctx, studio.setId);
+    if (rpt.len[1] >= 1) {
+        slider(box, "loop repeat end", { min: 1, max: rpt.len[1], step: 1, value: rpt.end[1], unit: " ms" }, (v) => attempt(() => {
+            const ms = Math.round(v);
+            studio.engine.setRepeat(studio.ctx, studio.setId, { start: [-1, -1, -1], end: [-1, ms, -1] });
+            studio.design.repeat = studio.engine.getRepeat(studio.ctx, studio.setId);
+        }));
+    }
     slider(box, "thickness", { min: 0, max: 1, step: 0.01, value: d.thickness ?? 0.6 }, (v) => attempt(() => {
         studio.engine.check(studio.engine.M._kova_set_thickness(studio.ctx, v), "setting the thickness");
         studio.design.thickness = v;
@@ -458,8 +467,10 @@ async function dropped(file, target) {
         slots[slot] = { name: file.name, bytes, pcm };
         studio.engine.replaceSlots(studio.ctx, studio.setId, slots);
         studio.design.slots[slot] = slots[slot];
-        // The new sound may change the set's levels (a new loop plays at the file level).
+        // The new sound may change the set's levels (a new loop plays at the file level), and
+        // its repeat points are the whole sound again.
         studio.design.tune = studio.engine.getTune(studio.ctx, studio.setId);
+        studio.design.repeat = studio.engine.getRepeat(studio.ctx, studio.setId);
         refreshControls();
         say(`${file.name} is now the ${SLOTS[slot]} sound`);
     } catch (e) {
