@@ -288,13 +288,13 @@ function buildFilterControls() {
                 studio.engine.attachFilter(studio.ctx, studio.setId, studio.format, type, next);
                 Object.assign(cur, patch);
                 studio.design.filters[type] = { ...cur };
-                drawFilterResponses();
+                buildFilterControls();
             } catch (e) {
                 say(`${e.message}; frequencies must lie strictly between 0 and half the rate (${nyquist} Hz)`, "error");
                 buildFilterControls(); // back to what the set holds
             }
         };
-        checkbox(row, `${name}${have ? "" : " (new)"}`, cur.enable, (on) => apply({ enable: on }));
+        checkbox(row, have ? name : `${name} (not in the set)`, cur.enable, (on) => apply({ enable: on }));
         slider(row, "frequency", { min: 20, max: nyquist * 0.98, value: Math.max(20, cur.freq), log: true, unit: " Hz" },
             (v) => apply({ freq: v }));
         if (type >= 2) {

@@ -45,7 +45,7 @@ export class PlayedStrip {
         for (let r = 0; r < rows; ++r) {
             const bin = Math.min(bins - 1, Math.floor(Math.pow(bins, 1 - r / rows)));
             const v = this.freq[bin] / 255;
-            g.fillStyle = `hsl(${240 - 200 * v}, 90%, ${8 + 55 * v}%)`;
+            g.fillStyle = v < 0.02 ? "#101418" : `hsl(${240 - 200 * v}, 90%, ${8 + 55 * v}%)`;
             g.fillRect(x, half + 1 + r, dx, 1);
         }
     }
