@@ -7,14 +7,18 @@
 #include <cmath>
 #include <cstdlib>
 #include <cstring>
-#include <fstream>
+#include <sstream>
 #include <functional>
 #include <numbers>
+
+#include "input_file.h"
 
 namespace kova_tool {
 namespace {
 
 constexpr size_t kMaxEvents = 1000000;
+/* A million events of about 30 bytes each, with room for comments. */
+constexpr int64_t kMaxCsvBytes = 64LL << 20;
 constexpr int64_t kMaxTimeMs = 24LL * 3600 * 1000;
 
 struct Point {
@@ -22,32 +26,15 @@ struct Point {
     double y;
 };
 
-std::string trim(const std::string& s) {
-    const size_t a = s.find_first_not_of(" \t\r");
-    if (a == std::string::npos) return "";
-    const size_t b = s.find_last_not_of(" \t\r");
-    return s.substr(a, b - a + 1);
-}
-
+/* The cells of one CSV line, trimmed. */
 std::vector<std::string> split(const std::string& line) {
-    std::vector<std::string> cells;
-    size_t from = 0;
-    for (;;) {
-        const size_t comma = line.find(',', from);
-        cells.push_back(trim(line.substr(from, comma - from)));
-        if (comma == std::string::npos) break;
-        from = comma + 1;
-    }
+    std::vector<std::string> cells = CLI::detail::split(line, ',');
+    for (std::string& c : cells) CLI::detail::trim(c);
     return cells;
 }
 
-std::string lower(std::string s) {
-    for (char& c : s) c = static_cast<char>(std::tolower(static_cast<unsigned char>(c)));
-    return s;
-}
-
 bool parse_action(const std::string& text, uint32_t& action) {
-    const std::string a = lower(text);
+    const std::string a = CLI::detail::to_lower(text);
     if (a == "down" || a == "start" || a == "0") {
         action = KOVA_ACTION_START;
     } else if (a == "move" || a == "1") {
@@ -170,8 +157,10 @@ std::vector<TouchEvent> builtin_gesture(const std::string& name, uint32_t hz, ui
 }
 
 std::vector<TouchEvent> read_gesture_csv(const std::string& path) {
-    std::ifstream in(path);
-    if (!in) failure("cannot open gesture file " + quoted(path) + ": " + std::strerror(errno));
+    std::string text = InputFile(path, "gesture file").read_all(kMaxCsvBytes);
+    // Spreadsheet programs save UTF-8 with a byte-order mark.
+    if (text.rfind("\xEF\xBB\xBF", 0) == 0) text.erase(0, 3);
+    std::istringstream in(text);
     std::vector<TouchEvent> events;
     std::string line;
     int lineno = 0;
@@ -181,11 +170,11 @@ std::vector<TouchEvent> read_gesture_csv(const std::string& path) {
     };
     while (std::getline(in, line)) {
         ++lineno;
-        const std::string t = trim(line);
+        const std::string t = CLI::detail::trim_copy(line);
         if (t.empty() || t[0] == '#') continue;
         std::vector<std::string> cells = split(t);
         if (!header) {
-            for (std::string& c : cells) c = lower(c);
+            for (std::string& c : cells) c = CLI::detail::to_lower(c);
             const bool ok = cells.size() >= 4 && cells.size() <= 5 && cells[0] == "time_ms" &&
                             cells[1] == "action" && cells[2] == "x" && cells[3] == "y" &&
                             (cells.size() == 4 || cells[4] == "aux");
@@ -200,7 +189,7 @@ std::vector<TouchEvent> read_gesture_csv(const std::string& path) {
         TouchEvent e;
         double v = 0;
         if (!parse_number(cells[0], v) || v != std::floor(v) || v < 0 || v > kMaxTimeMs) {
-            bad("time_ms " + quoted(cells[0]) + " is not a whole number of ms in 0.." +
+            bad("time_ms " + in_quotes(cells[0]) + " is not a whole number of ms in 0.." +
                 std::to_string(kMaxTimeMs));
         }
         e.time_ms = static_cast<int64_t>(v);
@@ -209,13 +198,14 @@ std::vector<TouchEvent> read_gesture_csv(const std::string& path) {
                 std::to_string(events.back().time_ms) + ")");
         }
         if (!parse_action(cells[1], e.action)) {
-            bad("action " + quoted(cells[1]) + " is unknown (accepted: down, move, up or 0, 1, 2)");
+            bad("action " + in_quotes(cells[1]) +
+                " is unknown (accepted: down, move, up or 0, 1, 2)");
         }
         const char* names[] = {"x", "y", "aux"};
         float* fields[] = {&e.x, &e.y, &e.aux};
         for (size_t i = 0; i + 2 < cells.size(); ++i) {
             if (!parse_number(cells[i + 2], v) || (i < 2 && (v < 0 || v > 1e6))) {
-                bad(std::string(names[i]) + " " + quoted(cells[i + 2]) +
+                bad(std::string(names[i]) + " " + in_quotes(cells[i + 2]) +
                     (i < 2 ? " is not a number of pixels in 0..1000000" : " is not a number"));
             }
             *fields[i] = static_cast<float>(v);
@@ -223,7 +213,6 @@ std::vector<TouchEvent> read_gesture_csv(const std::string& path) {
         if (events.size() == kMaxEvents) bad("more than " + std::to_string(kMaxEvents) + " events");
         events.push_back(e);
     }
-    if (in.bad()) failure("cannot read gesture file " + quoted(path) + ": " + std::strerror(errno));
     if (!header) failure(path + ": no header line time_ms,action,x,y[,aux]");
     if (events.empty()) failure(path + ": no events after the header");
     return events;

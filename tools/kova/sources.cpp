@@ -15,106 +15,41 @@
 
 #include "builtin_set.h"
 #include "builtin_sounds.h"
+#include "scratch_dir.h"
+#include "sound_input.h"
 #include "savefile_check.h"
 
 namespace kova_tool {
 namespace {
 
-constexpr uint32_t kSlotMax[KOVA_SLOT_COUNT] = {KOVA_SLOT_START_MAX_BYTES, KOVA_SLOT_LOOP_MAX_BYTES,
-                                                KOVA_SLOT_END_MAX_BYTES};
-
-/* A private folder for the built-in start and end sounds while the set is built: the engine
- * registers sounds from files only. Removed with everything in it when the set is done. */
-class TempDir {
-   public:
-    TempDir() {
-        const char* base = std::getenv("TMPDIR");
-        std::string tmpl = std::string(base && *base ? base : "/tmp") + "/kova-XXXXXX";
-        std::vector<char> buf(tmpl.begin(), tmpl.end());
-        buf.push_back('\0');
-        if (!mkdtemp(buf.data()))
-            failure("cannot create a temporary folder: " + std::string(std::strerror(errno)));
-        path_ = buf.data();
-    }
-    ~TempDir() {
-        for (const std::string& f : files_) unlink(f.c_str());
-        rmdir(path_.c_str());
-    }
-    TempDir(const TempDir&) = delete;
-    TempDir& operator=(const TempDir&) = delete;
-
-    std::string write(const std::string& name, const std::vector<int16_t>& pcm) {
-        const std::string file = path_ + "/" + name;
-        files_.push_back(file);
-        std::FILE* f = std::fopen(file.c_str(), "wb");
-        const size_t n = f ? std::fwrite(pcm.data(), sizeof(int16_t), pcm.size(), f) : 0;
-        if (!f || n != pcm.size() || std::fclose(f) != 0) {
-            failure("cannot write the built-in sound " + quoted(file) + ": " +
-                    std::strerror(errno));
-        }
-        return file;
-    }
-
-   private:
-    std::string path_;
-    std::vector<std::string> files_;
-};
-
-/* A raw PCM input must be a readable, non-empty regular file; longer ones are cut by the slot. */
-void check_pcm_file(int slot, const std::string& path, const KOVA_FORMAT& fmt) {
-    struct stat st {};
-    if (stat(path.c_str(), &st) != 0) {
-        failure("cannot read " + std::string(slot_name(slot)) + " sound " + quoted(path) + ": " +
-                std::strerror(errno));
-    }
-    if (!S_ISREG(st.st_mode))
-        failure(std::string(slot_name(slot)) + " sound " + quoted(path) + " is not a file");
-    if (access(path.c_str(), R_OK) != 0) {
-        failure("cannot read " + std::string(slot_name(slot)) + " sound " + quoted(path) + ": " +
-                std::strerror(errno));
-    }
-    if (st.st_size == 0)
-        failure(std::string(slot_name(slot)) + " sound " + quoted(path) + " is empty");
-    if (static_cast<uint64_t>(st.st_size) > kSlotMax[slot]) {
-        const double ms = kSlotMax[slot] * 1000.0 / (2.0 * fmt.sample_rate * fmt.channels);
-        std::fprintf(
-            stderr, "kova: note: %s is %lld bytes; the %s slot keeps the first %u (%.0f ms)\n",
-            path.c_str(), static_cast<long long>(st.st_size), slot_name(slot), kSlotMax[slot], ms);
-    }
-}
-
 void check(int32_t code, const std::string& what) {
     if (code != KOVA_OK) failure(what + ": " + library_error(code));
 }
 
-/* Slot paths for the engine: user files as given, "builtin" written to the temporary folder,
- * empty ones null. */
+/* Slot paths for the engine: every sound converted to its format and written to the scratch
+ * folder (the engine reads raw PCM files only), empty slots null. */
 struct SlotPaths {
     std::string path[KOVA_SLOT_COUNT];
     const char* ptr[KOVA_SLOT_COUNT] = {nullptr, nullptr, nullptr};
     bool any = false;
 };
 
-SlotPaths slot_paths(const SourceOptions& src, const KOVA_FORMAT& fmt, TempDir*& temp,
-                     std::unique_ptr<TempDir>& temp_owner) {
+SlotPaths slot_paths(const SourceOptions& src, const KOVA_FORMAT& fmt, ScratchDir& scratch) {
     SlotPaths p;
     for (int s = 0; s < KOVA_SLOT_COUNT; ++s) {
-        if (src.slot[s].empty()) continue;
-        if (src.slot[s] == kBuiltinSound) {
-            if (!temp) {
-                temp_owner = std::make_unique<TempDir>();
-                temp = temp_owner.get();
-            }
-            p.path[s] =
+        const std::string& given = src.slot[static_cast<size_t>(s)];
+        if (given.empty()) continue;
+        const std::string name = std::string(slot_name(s)) + ".pcm";
+        if (given == kBuiltinSound) {
+            p.path[s] = scratch.write(
+                name,
                 s == KOVA_SLOT_START
-                    ? temp->write("start.pcm",
-                                  builtin_start_sound(fmt.sample_rate, fmt.channels, kSlotMax[s]))
-                    : temp->write("end.pcm",
-                                  builtin_end_sound(fmt.sample_rate, fmt.channels, kSlotMax[s]));
+                    ? builtin_start_sound(fmt.sample_rate, fmt.channels, KOVA_SLOT_START_MAX_BYTES)
+                    : builtin_end_sound(fmt.sample_rate, fmt.channels, KOVA_SLOT_END_MAX_BYTES));
         } else {
-            check_pcm_file(s, src.slot[s], fmt);
-            p.path[s] = src.slot[s];
+            p.path[s] = scratch.write(name, read_sound(given, s, fmt, src.raw));
         }
+        if (p.path[s].empty()) failure("cannot write the " + name + " sound to a temporary folder");
         p.ptr[s] = p.path[s].c_str();
         p.any = true;
     }
@@ -142,6 +77,13 @@ void apply_repeats(Engine& engine, int32_t id, const std::vector<RepeatArg>& rep
         }
         if (r.start_ms >= 0) want.rpt_start_ms[r.slot] = r.start_ms;
         if (r.end_ms >= 0) want.rpt_end_ms[r.slot] = r.end_ms;
+        // A number left out keeps the stored one, so the order is checked against that.
+        const int32_t start = r.start_ms >= 0 ? r.start_ms : now.rpt_start_ms[r.slot];
+        const int32_t end = r.end_ms >= 0 ? r.end_ms : now.rpt_end_ms[r.slot];
+        if (start > end) {
+            usage_error(opt + ": start " + std::to_string(start) + " is after end " +
+                        std::to_string(end) + " (START_MS must not exceed END_MS)");
+        }
     }
     check(kova_set_rptinfo(engine.ctx(), id, &want), "setting the repeat points");
 }
@@ -200,27 +142,10 @@ int32_t generate_event(const Engine& engine, const TouchEvent& e, std::vector<in
 }
 
 std::string library_error(int32_t code) {
-    const char* what = "unknown error";
-    switch (code) {
-        case KOVA_ERR_INVALID_FORMAT:
-            what = "format rejected";
-            break;
-        case KOVA_ERR_INSUFF_MEM:
-            what = "out of memory";
-            break;
-        case KOVA_ERR_INVALID_PARAM:
-            what = "invalid parameter";
-            break;
-        case KOVA_ERR_SOURCE:
-            what = "sound source could not be loaded";
-            break;
-        case KOVA_ERR_SRC_FULL:
-            what = "too many source sets";
-            break;
-        default:
-            break;
-    }
-    return std::string(what) + " (library code " + std::to_string(code) + ")";
+    static const char* const what[] = {"format rejected", "out of memory", "invalid parameter",
+                                       "sound source could not be loaded", "too many source sets"};
+    return std::string(code <= -1 && code >= -5 ? what[-code - 1] : "unknown error") +
+           " (library code " + std::to_string(code) + ")";
 }
 
 PreparedSet prepare_set(Engine& engine, const SetupOptions& setup) {
@@ -232,17 +157,15 @@ PreparedSet prepare_set(Engine& engine, const SetupOptions& setup) {
         // The file's samples play as they are: at another format they play at another pitch.
         if (saved.rate != static_cast<int32_t>(fmt.sample_rate) ||
             saved.channels != static_cast<int32_t>(fmt.channels)) {
-            std::fprintf(stderr,
-                         "kova: note: %s was saved for %d Hz, %d channel(s); it plays at %u Hz, "
-                         "%u channel(s)\n",
-                         src.set_path.c_str(), saved.rate, saved.channels, fmt.sample_rate,
-                         fmt.channels);
+            note(in_quotes(src.set_path) + " was saved for " + std::to_string(saved.rate) +
+                 " Hz, " + std::to_string(saved.channels) + " channel(s); it plays at " +
+                 std::to_string(fmt.sample_rate) + " Hz, " + std::to_string(fmt.channels) +
+                 " channel(s)");
         }
     }
 
-    std::unique_ptr<TempDir> temp_owner;
-    TempDir* temp = nullptr;
-    const SlotPaths paths = slot_paths(src, fmt, temp, temp_owner);
+    ScratchDir scratch; /* kept until the filters are attached: they reload file sounds */
+    const SlotPaths paths = slot_paths(src, fmt, scratch);
 
     KOVA_CTX* ctx = engine.ctx();
     PreparedSet set;
@@ -256,7 +179,7 @@ PreparedSet prepare_set(Engine& engine, const SetupOptions& setup) {
     } else if (!src.set_path.empty()) {
         set.id = kova_reg_src_bysavefile(ctx, src.set_path.c_str(), &err);
         if (!set.id)
-            failure("cannot register source-set file " + quoted(src.set_path) + ": " +
+            failure("cannot register source-set file " + in_quotes(src.set_path) + ": " +
                     library_error(err));
         replace_slots = paths.any;
     } else if (!src.slot[KOVA_SLOT_LOOP].empty()) {
@@ -265,7 +188,7 @@ PreparedSet prepare_set(Engine& engine, const SetupOptions& setup) {
     } else {
         set.id = kova_reg_src_byfilter(ctx, &src.filters[0].dsc, &err);
         if (!set.id)
-            failure("cannot register filter " + quoted(src.filters[0].text) + ": " +
+            failure("cannot register filter " + in_quotes(src.filters[0].text) + ": " +
                     library_error(err));
         set.noise_loop = true;
         first_attached = 1;
@@ -290,18 +213,16 @@ PreparedSet prepare_set(Engine& engine, const SetupOptions& setup) {
     for (size_t i = first_attached; i < src.filters.size(); ++i) {
         err = KOVA_OK;
         if (!kova_attach_filter(ctx, set.id, &src.filters[i].dsc, &err)) {
-            failure("cannot attach filter " + quoted(src.filters[i].text) + ": " +
+            failure("cannot attach filter " + in_quotes(src.filters[i].text) + ": " +
                     library_error(err));
         }
     }
-    temp_owner.reset();
 
     check(kova_set_active_src(ctx, set.id), "selecting the source set");
     apply_repeats(engine, set.id, src.repeats);
     apply_tune(engine, set.id, setup.tune, base);
-    if (setup.level.thickness)
-        check(kova_set_thickness(ctx, *setup.level.thickness), "setting the thickness");
-    if (setup.level.volume) check(kova_set_volume(ctx, *setup.level.volume), "setting the volume");
+    if (setup.thickness) check(kova_set_thickness(ctx, *setup.thickness), "setting the thickness");
+    if (setup.volume) check(kova_set_volume(ctx, *setup.volume), "setting the volume");
     return set;
 }
 
