@@ -87,15 +87,11 @@ void finish_filter(FilterArg& f, const FormatOptions& fmt) {
                     " is unknown (accepted: lowpass, highpass, bandpass, bandreject)");
     }
     const double nyquist = fmt.rate / 2.0;
-    try {
-        f.dsc = KOVA_FLT_DSC{};
-        f.dsc.type = type;
-        f.dsc.freq = number_in("--filter frequency", parts[1], 1.0, nyquist - 1.0, "Hz");
-        if (parts.size() == 3)
-            f.dsc.bandwidth = number_in("--filter bandwidth", parts[2], 1.0, nyquist, "Hz");
-    } catch (const CLI::ValidationError& e) {
-        usage_error(e.what());
-    }
+    f.dsc = KOVA_FLT_DSC{};
+    f.dsc.type = type;
+    f.dsc.freq = number_in("--filter frequency", parts[1], 1.0, nyquist - 1.0, "Hz");
+    if (parts.size() == 3)
+        f.dsc.bandwidth = number_in("--filter bandwidth", parts[2], 1.0, nyquist, "Hz");
     if (parts.size() == 2 && (type == KOVA_FLT_BANDPASS || type == KOVA_FLT_BANDREJECT)) {
         usage_error("--filter " + in_quotes(f.text) + " needs a bandwidth: " +
                     std::string(filter_type_name(type)) + ":FREQ:BANDWIDTH");
@@ -105,14 +101,21 @@ void finish_filter(FilterArg& f, const FormatOptions& fmt) {
     f.dsc.channels = static_cast<int32_t>(fmt.channels);
 }
 
-CLI::Option* add_tune(CLI::App& app, const std::string& name, std::optional<double>& field,
-                      const std::string& help) {
+/* Sets the value's placeholder in the help and the help section. */
+CLI::Option* shown(CLI::Option* option, const std::string& type, const std::string& group) {
+    return option->type_name(type)->group(group);
+}
+
+constexpr const char* kTuneGroup = "Tune set (each 0..1; unset values keep the set's own)";
+
+CLI::Option* add_level(CLI::App& app, const std::string& name, std::optional<double>& field,
+                       const std::string& help, const std::string& group) {
     return app
         .add_option_function<double>(
             name, [&field](const double& v) { field = v; }, help)
         ->check(in_range(0, 1))
         ->type_name("X")
-        ->group("Tune set (each 0..1; unset values keep the set's own)");
+        ->group(group);
 }
 
 /* The tune values each kind of set starts with, from the library's defaults and the built-in
@@ -203,15 +206,12 @@ CLI::Option* add_size(CLI::App& app, const std::string& name, uint32_t& w, uint3
 
 void add_setup_options(CLI::App& app, SetupOptions& s, bool player) {
     FormatOptions& f = s.format;
-    const std::string format = "Format";
-    app.add_option("--rate", f.rate, "sample rate, 8000..48000 Hz (default 48000)")
-        ->check(in_range(8000, 48000, "Hz", true))
-        ->type_name("HZ")
-        ->group(format);
-    app.add_option("--channels", f.channels, "1 or 2 (default 2)")
-        ->check(in_range(1, 2, "", true))
-        ->type_name("N")
-        ->group(format);
+    const std::string format = "Format", tune = kTuneGroup;
+    shown(app.add_option("--rate", f.rate, "sample rate, 8000..48000 Hz (default 48000)"), "HZ",
+          format)
+        ->check(in_range(8000, 48000, "Hz", true));
+    shown(app.add_option("--channels", f.channels, "1 or 2 (default 2)"), "N", format)
+        ->check(in_range(1, 2, "", true));
     add_on_off(app, "--panning", f.panning,
                "left/right follows the touch position (default: on in stereo)")
         ->group(format);
@@ -223,76 +223,50 @@ void add_setup_options(CLI::App& app, SetupOptions& s, bool player) {
     const std::string source =
         "Source set (default: the built-in set, a band-pass noise loop with the tool's own start "
         "and end sounds)";
-    app.add_option("--set", src.set_path, "a saved source-set file")
-        ->type_name("FILE")
-        ->group(source);
+    shown(app.add_option("--set", src.set_path, "a saved source-set file"), "FILE", source);
     const char* slot_help[KOVA_SLOT_COUNT] = {
         "start sound: a sound file, or builtin for the tool's own tick",
         "loop sound: a sound file (WAV, FLAC, Ogg, ... or raw PCM)",
         "end sound: a sound file, or builtin for the tool's own lift-off sound"};
-    for (int slot = 0; slot < KOVA_SLOT_COUNT; ++slot) {
-        app.add_option("--" + std::string(slot_name(slot)), src.slot[static_cast<size_t>(slot)],
-                       slot_help[slot])
-            ->type_name(slot == KOVA_SLOT_LOOP ? "FILE" : "FILE|builtin")
-            ->check(CLI::Validator(
-                [](std::string& v) { return v.empty() ? "needs a file name" : ""; }, ""))
-            ->group(source);
+    for (size_t slot = 0; slot < KOVA_SLOT_COUNT; ++slot) {
+        shown(app.add_option("--" + std::string(slot_name(static_cast<int>(slot))), src.slot[slot],
+                             slot_help[slot]),
+              slot == KOVA_SLOT_LOOP ? "FILE" : "FILE|builtin", source)
+            ->check(
+                CLI::Validator([](std::string& v) { return v.empty() ? "needs a file" : ""; }, ""));
     }
     app.add_flag("--raw", src.raw,
                  "read every sound file as raw 16-bit PCM at --rate/--channels (files named "
                  "*.raw or *.pcm always are)")
         ->group(source);
-    app.add_option_function<std::vector<std::string>>(
-           "--filter",
-           [&src](const std::vector<std::string>& v) {
-               for (const std::string& t : v) src.filters.push_back(FilterArg{t, {}});
-           },
-           "TYPE:FREQ[:BANDWIDTH], TYPE lowpass, highpass, bandpass or bandreject (Hz); without "
-           "--loop/--set the loop is white noise through the filters, otherwise they are "
-           "attached to the set; repeatable")
-        ->expected(1)
-        ->take_all()
-        ->type_name("TYPE:FREQ[:BW]")
-        ->group(source);
-    app.add_option_function<std::vector<std::string>>(
-           "--repeat",
-           [&src](const std::vector<std::string>& v) {
-               for (const std::string& t : v) src.repeats.push_back(parse_repeat(t));
-           },
-           "repeat points in ms of slot start, loop or end; START <= END, a number left out "
-           "keeps its value")
-        ->expected(1)
-        ->take_all()
-        ->type_name("SLOT=START:END")
-        ->group(source);
-
+    shown(app.add_option("--filter", src.filter_texts,
+                         "TYPE:FREQ[:BANDWIDTH], TYPE lowpass, highpass, bandpass or bandreject "
+                         "(Hz); without --loop/--set the loop is white noise through the "
+                         "filters, otherwise they are attached to the set; repeatable"),
+          "TYPE:FREQ[:BW]", source)
+        ->allow_extra_args(false);
+    shown(app.add_option("--repeat", src.repeat_texts,
+                         "repeat points in ms of slot start, loop or end; START <= END, a number "
+                         "left out keeps its value"),
+          "SLOT=START:END", source)
+        ->allow_extra_args(false);
     TuneOptions& t = s.tune;
-    add_tune(app, "--gain", t.gain, "factor of every level");
-    add_tune(app, "--pan", t.pan, "depth of position panning");
-    add_tune(app, "--wn-gain", t.wn_gain, "level of a noise loop");
-    add_tune(app, "--file-gain", t.file_gain, "level of a loop from a file or saved set");
-    add_tune(app, "--start-gain", t.start_gain, "level of the start sound");
-    add_tune(app, "--loop-gain", t.loop_gain, "level of the loop sound");
-    add_tune(app, "--end-gain", t.end_gain, "level of the end sound");
-    const std::string tune = "Tune set (each 0..1; unset values keep the set's own)";
+    add_level(app, "--gain", t.gain, "factor of every level", tune);
+    add_level(app, "--pan", t.pan, "depth of position panning", tune);
+    add_level(app, "--wn-gain", t.wn_gain, "level of a noise loop", tune);
+    add_level(app, "--file-gain", t.file_gain, "level of a loop from a file or saved set", tune);
+    add_level(app, "--start-gain", t.start_gain, "level of the start sound", tune);
+    add_level(app, "--loop-gain", t.loop_gain, "level of the loop sound", tune);
+    add_level(app, "--end-gain", t.end_gain, "level of the end sound", tune);
     add_on_off(app, "--osc", t.osc, "speed-following amplitude modulation")->group(tune);
-    add_tune(app, "--osc-depth", t.osc_depth, "oscillator depth; turns the oscillator on");
+    add_level(app, "--osc-depth", t.osc_depth, "oscillator depth; turns the oscillator on", tune);
     add_on_off(app, "--sharp", t.sharp, "pitch rises with speed")->group(tune);
-    add_tune(app, "--sharpness", t.sharpness, "pitch raising depth; turns it on");
+    add_level(app, "--sharpness", t.sharpness, "pitch raising depth; turns it on", tune);
     if (player) {
-        const std::string level = "Player";
-        app.add_option_function<double>(
-               "--thickness", [&s](const double& v) { s.thickness = v; },
-               "equaliser thickness, 0..1 (default 0.6)")
-            ->check(in_range(0, 1))
-            ->type_name("X")
-            ->group(level);
-        app.add_option_function<double>(
-               "--volume", [&s](const double& v) { s.volume = v; },
-               "output volume, 0..1 (default 1, the library's 0.8 of full scale)")
-            ->check(in_range(0, 1))
-            ->type_name("X")
-            ->group(level);
+        add_level(app, "--thickness", s.thickness, "equaliser thickness, 0..1 (default 0.6)",
+                  "Player");
+        add_level(app, "--volume", s.volume,
+                  "output volume, 0..1 (default 1, the library's 0.8 of full scale)", "Player");
     }
     app.footer(tune_defaults());
 }
@@ -329,6 +303,8 @@ void finish_setup(SetupOptions& s) {
             "--start and --end need a loop: give --loop FILE, --filter TYPE:FREQ[:BANDWIDTH] or "
             "--set FILE");
     }
+    for (const std::string& text : src.repeat_texts) src.repeats.push_back(parse_repeat(text));
+    for (const std::string& text : src.filter_texts) src.filters.push_back(FilterArg{text, {}});
     std::set<uint32_t> types;
     for (FilterArg& given : src.filters) {
         finish_filter(given, f);

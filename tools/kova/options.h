@@ -50,11 +50,12 @@ struct SourceOptions {
     std::string set_path;                            /* --set: a saved source-set file */
     std::array<std::string, KOVA_SLOT_COUNT> slot{}; /* --start/--loop/--end: a file or builtin */
     bool raw = false;                                /* --raw: every sound file is raw PCM */
+    std::vector<std::string> filter_texts, repeat_texts; /* as given; parsed by finish_setup */
     std::vector<FilterArg> filters;
     std::vector<RepeatArg> repeats;
 
     bool builtin() const {
-        return set_path.empty() && slot[KOVA_SLOT_LOOP].empty() && filters.empty();
+        return set_path.empty() && slot[KOVA_SLOT_LOOP].empty() && filter_texts.empty();
     }
 };
 

@@ -84,7 +84,8 @@ void print_text(const std::string& path, const FileInfo& in) {
     }
     if (!any) std::fprintf(f, "  (none)\n");
     std::fprintf(f, "\ntune set:\n");
-    for (const auto& [name, value] : tune_json(in.tune).items())
+    const nlohmann::ordered_json tune = tune_json(in.tune);
+    for (const auto& [name, value] : tune.items())
         std::fprintf(f, "  %-12s %s\n", name.c_str(), value.dump().c_str());
 }
 

@@ -75,14 +75,13 @@ void apply_repeats(Engine& engine, int32_t id, const std::vector<RepeatArg>& rep
             usage_error(opt + " end 0 is out of range (accepted: 1.." + std::to_string(len) +
                         " ms)");
         }
-        if (r.start_ms >= 0) want.rpt_start_ms[r.slot] = r.start_ms;
-        if (r.end_ms >= 0) want.rpt_end_ms[r.slot] = r.end_ms;
-        // A number left out keeps the stored one, so the order is checked against that.
-        const int32_t start = r.start_ms >= 0 ? r.start_ms : now.rpt_start_ms[r.slot];
-        const int32_t end = r.end_ms >= 0 ? r.end_ms : now.rpt_end_ms[r.slot];
-        if (start > end) {
-            usage_error(opt + ": start " + std::to_string(start) + " is after end " +
-                        std::to_string(end) + " (START_MS must not exceed END_MS)");
+        // A number left out keeps the value before, so the order is checked on the result.
+        if (r.start_ms >= 0) want.rpt_start_ms[r.slot] = now.rpt_start_ms[r.slot] = r.start_ms;
+        if (r.end_ms >= 0) want.rpt_end_ms[r.slot] = now.rpt_end_ms[r.slot] = r.end_ms;
+        if (now.rpt_start_ms[r.slot] > now.rpt_end_ms[r.slot]) {
+            usage_error(opt + ": start " + std::to_string(now.rpt_start_ms[r.slot]) +
+                        " is after end " + std::to_string(now.rpt_end_ms[r.slot]) +
+                        " (START_MS must not exceed END_MS)");
         }
     }
     check(kova_set_rptinfo(engine.ctx(), id, &want), "setting the repeat points");
