@@ -390,12 +390,13 @@ function inspectText(name, info) {
             `${f.enable === 1 ? "on " : "off"}  (for ${f.samplerate} Hz, ${f.channels} channel${f.channels === 1 ? "" : "s"})`);
     }
     if (!info.filters.length) lines.push("  (none)");
-    const t = info.tune;
-    lines.push("", "tune set:", `  gain        ${t.gain}`, `  pan         ${t.pan}`,
-        `  oscillator  ${t.osc_enable === 1 ? "on" : "off"}, depth ${t.osc_depth}`,
-        `  sharpening  ${t.sharp_enable === 1 ? "on" : "off"}, sharpness ${t.sharpness}`,
-        `  wn_gain     ${t.wn_gain}`, `  file_gain   ${t.file_gain}`, `  start_gain  ${t.start_gain}`,
-        `  loop_gain   ${t.loop_gain}`, `  end_gain    ${t.end_gain}`);
+    // Each tune value as JSON writes it: doubles with a fraction part, NaN as null.
+    lines.push("", "tune set:");
+    for (const [name, value] of Object.entries(info.tune)) {
+        const int = name.endsWith("_enable");
+        const text = Number.isNaN(value) ? "null" : int || !Number.isInteger(value) ? String(value) : value.toFixed(1);
+        lines.push(`  ${name.padEnd(12)} ${text}`);
+    }
     return lines.join("\n");
 }
 
