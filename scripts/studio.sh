@@ -44,7 +44,8 @@ case "$mode" in
     cmake --build "$out/native" -j "$jobs" --target KovaFastTrack kova >>"$out.native.log" 2>&1 ||
         { tail -n 40 "$out.native.log"; exit 1; }
     echo "== studio: browser tests (headless Chromium)"
-    "$python" studio/tests/browser_test.py --site "$site" --artifacts "$out/test" \
+    # Bounded, so a browser that hangs fails the stage instead of stalling it.
+    timeout --kill-after=10 600 "$python" studio/tests/browser_test.py --site "$site" --artifacts "$out/test" \
         --library "$out/native/libKovaFastTrack.so" --kova "$out/native/tools/kova"
     ;;
 serve)

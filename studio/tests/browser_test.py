@@ -147,7 +147,7 @@ class Page:
         self.profile = tempfile.mkdtemp(prefix="kova-studio-profile-")
         for a in ("--headless=new", "--no-sandbox", "--disable-gpu", "--disable-quic",
                   "--no-first-run", "--disable-background-networking", "--disable-component-update",
-                  "--disable-sync", f"--user-data-dir={self.profile}",
+                  "--disable-sync", "--disable-dev-shm-usage", f"--user-data-dir={self.profile}",
                   "--autoplay-policy=no-user-gesture-required", "--window-size=1280,900"):
             opts.add_argument(a)
         opts.set_capability("goog:loggingPrefs", {"browser": "ALL"})
