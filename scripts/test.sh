@@ -12,10 +12,12 @@
 #      x86-64 and AArch64 (scripts/aarch64.sh);
 #   7. consumer: install into a temporary prefix, then find_package, pkg-config, the README's C
 #      snippet and add_subdirectory (scripts/consumer.sh);
-#   8. docs: the API reference (kova_docs: Doxygen, warnings are errors, every export named).
+#   8. docs: the API reference (kova_docs: Doxygen, warnings are errors, every export named);
+#   9. studio: the engine built to WebAssembly and its page tested in headless Chromium against
+#      the native library (scripts/studio.sh --test).
 # Environment: KOVA_JOBS (parallel jobs), KOVA_SOAK_SECONDS (default 20), KOVA_FUZZ_SECONDS
 # (per target, default 60), KOVA_SKIP (space-separated stage names to skip: valgrind soak tsan
-# fuzz aarch64 consumer docs).
+# fuzz aarch64 consumer docs studio).
 set -euo pipefail
 root=$(cd "$(dirname "$0")/.." && pwd)
 cd "$root"
@@ -144,6 +146,11 @@ fi
 if ! skipped aarch64; then
     scripts/aarch64.sh build
     stage_done "aarch64 cross build + qemu tests"
+fi
+
+if ! skipped studio; then
+    KOVA_JOBS=$jobs scripts/studio.sh --test
+    stage_done "studio wasm build + browser tests"
 fi
 
 echo "== stage times"

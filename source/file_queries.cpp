@@ -80,9 +80,9 @@ struct SourceWalk {
         if (r < 1) return fail();
         // The reference words (addresses when it was written) are not read.
         *record = KOVA_SRC{};
-        record->size = load<int32_t>(image, offsetof(KOVA_SRC, size));
-        record->rpt_start = load<int32_t>(image, offsetof(KOVA_SRC, rpt_start));
-        record->rpt_end = load<int32_t>(image, offsetof(KOVA_SRC, rpt_end));
+        record->size = load<int32_t>(image, kSrcSizeAt);
+        record->rpt_start = load<int32_t>(image, kSrcRptStartAt);
+        record->rpt_end = load<int32_t>(image, kSrcRptEndAt);
         pos += r;
         if (pos > INT32_MAX) return fail();
         *payload = static_cast<int32_t>(pos);

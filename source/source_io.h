@@ -49,6 +49,24 @@ constexpr int kTuneSetBytes = 88;
 constexpr int kSrcInfoBytes = 20;
 constexpr int kSrcRecordBytes = 48;
 
+// Offsets of the fields of a stored source record: the image of KOVA_SRC on a 64-bit target
+// (three 8-byte reference words, then six 32-bit fields). Fixed numbers rather than offsetof, so
+// a 32-bit build reads and writes the same files.
+constexpr size_t kSrcSizeAt = 24;
+constexpr size_t kSrcPosAt = 28;
+constexpr size_t kSrcSlotAt = 32;
+constexpr size_t kSrcOriginAt = 36;
+constexpr size_t kSrcRptStartAt = 40;
+constexpr size_t kSrcRptEndAt = 44;
+#if UINTPTR_MAX > 0xFFFFFFFFu
+static_assert(offsetof(KOVA_SRC, size) == kSrcSizeAt && offsetof(KOVA_SRC, pos) == kSrcPosAt &&
+                  offsetof(KOVA_SRC, slot) == kSrcSlotAt &&
+                  offsetof(KOVA_SRC, origin) == kSrcOriginAt &&
+                  offsetof(KOVA_SRC, rpt_start) == kSrcRptStartAt &&
+                  offsetof(KOVA_SRC, rpt_end) == kSrcRptEndAt,
+              "a 64-bit KOVA_SRC is the stored record's image");
+#endif
+
 // Reads a field of a stored record image at its byte offset.
 template <typename T>
 T load(const unsigned char* image, size_t offset) {

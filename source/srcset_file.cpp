@@ -58,9 +58,9 @@ KOVA_SRC* read_src_record(void* h, TARQ_MFAL* mfal, int32_t max_bytes, SrcReadSt
     // A record read in part is used: the fields the file did not reach stay 0.
     unsigned char image[kSrcRecordBytes] = {};
     if (mfal->read(h, image, kSrcRecordBytes) < 1) return drop(SrcReadStatus::kUnusable);
-    const auto stored_size = load<int32_t>(image, offsetof(KOVA_SRC, size));
-    src->pos = load<int32_t>(image, offsetof(KOVA_SRC, pos));
-    src->slot = load<int32_t>(image, offsetof(KOVA_SRC, slot));
+    const auto stored_size = load<int32_t>(image, kSrcSizeAt);
+    src->pos = load<int32_t>(image, kSrcPosAt);
+    src->slot = load<int32_t>(image, kSrcSlotAt);
     src->origin = KOVA_ORIGIN_SAVEFILE;
     // No buffer has a negative size: such a record is not used.
     if (stored_size < 0) return drop(SrcReadStatus::kUnusable);
@@ -86,8 +86,8 @@ KOVA_SRC* read_src_record(void* h, TARQ_MFAL* mfal, int32_t max_bytes, SrcReadSt
     if (got > 0) std::memcpy(src->pcm_proc, src->pcm, static_cast<size_t>(got));
 
     // Playback trusts the repeat points to lie within the samples.
-    src->rpt_start = std::clamp(load<int32_t>(image, offsetof(KOVA_SRC, rpt_start)), 0, got);
-    src->rpt_end = std::clamp(load<int32_t>(image, offsetof(KOVA_SRC, rpt_end)), 0, got);
+    src->rpt_start = std::clamp(load<int32_t>(image, kSrcRptStartAt), 0, got);
+    src->rpt_end = std::clamp(load<int32_t>(image, kSrcRptEndAt), 0, got);
     *status = SrcReadStatus::kOk;
     return src;
 }
