@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Counting malloc interposer. The definitions below take the place of the C library's allocation
 // entry points for the whole process (an executable's symbols come first in the lookup); each one
 // counts and forwards to glibc's own implementation. Operator new ends up here too.

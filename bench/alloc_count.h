@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Heap accounting for the benchmarks: a malloc interposer that counts every allocation made by
 // the calling thread (whoever makes it: the library, the C++ runtime, a peer library), and the
 // allocator's own live-byte figure.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Monotonic clock in seconds and sleeping until a point on it, for the benchmarks that pace
 // events in real time.
 #ifndef KOVA_BENCH_CLOCK_H

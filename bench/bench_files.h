@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The sound files every benchmark instance registers: start, loop and end PCM of the largest
 // sizes a file may have (38400, 192000 and 38400 bytes of noise-like stereo 16-bit), written once
 // into a temporary directory that is removed at exit.

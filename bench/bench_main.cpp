@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Benchmark program: every figure of the library is measured next to its peer in the same run;
 // the tables at the end give the ratios. Usage: kova_bench [google benchmark flags]
 #include <benchmark/benchmark.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Each benchmark file registers its benchmarks and its summary section through one of these.
 #ifndef KOVA_BENCH_REGISTRY_H
 #define KOVA_BENCH_REGISTRY_H

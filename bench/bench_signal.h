@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Test signals and small helpers shared by the benchmark files.
 #ifndef KOVA_BENCH_SIGNAL_H
 #define KOVA_BENCH_SIGNAL_H

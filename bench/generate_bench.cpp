@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Generation per motion event on an engine that plays the three registered files: time per event,
 // real-time factor (seconds of audio per second of CPU) and heap allocations per event.
 #include <cstdint>

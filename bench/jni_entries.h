@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The Java entry points the native benchmarks call directly. These use neither the JNI
 // environment nor the class, so both are passed as null.
 #ifndef KOVA_BENCH_JNI_ENTRIES_H

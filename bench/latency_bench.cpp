@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Latency as an application meets it: from the gen_tofasttrack call of an event to the moment
 // the output device pulls the first byte of that event's sound, for the start event and for the
 // moves of a steady stroke (one every 16 ms, 16 ms of sound each), and how much sound is queued

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // 20 instances whose strokes start at the same instant, as twenty views of an application might
 // on one touch: each Java thread calls gen_tofasttrack with a start event, and every call holds
 // the process-wide registry lock while it generates its start sound. Figures: how long after the

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Heap held by one instance, step by step as an application builds it: the Java init (instance
 // record, its 960000-byte PCM buffer, the output stream with its ring buffer, the engine
 // context), then a source set registered from three files, then one registered from a saved file.

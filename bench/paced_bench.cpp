@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Moves paced as a finger makes them: one event every 16 ms, with the caches evicted in between
 // (an application and the system run between two touch events). Wall time of each call, next
 // to the back-to-back figure of the same move, which keeps its data cached and understates

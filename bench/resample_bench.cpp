@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Resampling one generation block: the library's stereo resampler against what a caller holding
 // 16-bit PCM would otherwise use: libsamplerate's linear converter (with its 16-bit <-> float
 // conversions, and without them) and the speexdsp resampler at quality 0 on interleaved 16-bit

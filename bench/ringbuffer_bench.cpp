@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Queueing PCM between the generator and the output callback: the library's ring buffer against
 // JACK's lock-free ring buffer and against copying the same bytes in and out with memcpy alone;
 // and the ring buffer as it runs in the output stream, each write and each pull under the

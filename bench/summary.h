@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Collects what every benchmark measured in this run and prints, at the end, the comparison
 // tables: each figure of the library next to its peer's and the ratio between the two.
 #ifndef KOVA_BENCH_SUMMARY_H

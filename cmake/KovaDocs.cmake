@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # kova_docs: the API reference, HTML under <build>/docs/api/html: Doxygen from the public headers
 # and docs/api/mainpage.md, the event-path diagram drawn by graphviz from docs/event-path.dot, and
 # the Java class's Javadoc under html/java. Any Doxygen or Javadoc warning fails the target, and so

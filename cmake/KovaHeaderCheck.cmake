@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # Every header directly in include/kova/ must compile on its own, first in a translation unit,
 # as C11 and as C++17, with -Wall -Wextra -Werror and only the public include folder on the path.
 # The headers under include/kova/android/ are C++ only and need the platform's headers: each is

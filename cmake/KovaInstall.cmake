@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # Install rules and packages: the library (and, off Android, the AudioTrack stand-in it links),
 # the public headers, a CMake package exporting KovaFastTrack::KovaFastTrack, and a pkg-config
 # file. The jar is installed by java/CMakeLists.txt.

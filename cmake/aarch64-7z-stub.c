@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Stand-in for p7zip's 7z.so in AArch64 test runs under qemu-user.
  *
  * Debian's AOSP libbacktrace (pulled in by libutils) needs 7z.so, which exists only for the host

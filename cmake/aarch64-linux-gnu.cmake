@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # Cross build for 64-bit Arm Linux with Debian's aarch64-linux-gnu GCC. Binaries run on an x86-64
 # host through qemu-user (tests and test discovery go through CMAKE_CROSSCOMPILING_EMULATOR).
 # Needs: g++-aarch64-linux-gnu, qemu-user and the :arm64 builds of android-liblog-dev,

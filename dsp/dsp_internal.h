@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Signal-block helpers shared inside the library and with its tests. Not exported. */
 #ifndef KOVA_DSP_INTERNAL_H
 #define KOVA_DSP_INTERNAL_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Three-band thickness equaliser: two first-order low-pass sections split low, mid and high. */
 #include <cmath>
 #include <cstring>

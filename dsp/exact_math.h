@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Arithmetic helpers shared by the signal blocks, where outputs must be bit-exact on every target.
  *
  * Include this header LAST in a source file: the pragma below applies to every function defined

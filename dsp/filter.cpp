@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Second-order IIR filters (low-pass, high-pass, band-pass, band-reject) on interleaved PCM. */
 #include <cmath>
 #include <cstdio>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Filter bank: enabled filters run in parallel on copies of a buffer, the result is their mean. */
 #include <cstdint>
 #include <cstring>

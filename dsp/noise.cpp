@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* White noise at a tenth of full scale, and noise sound sources for the slots of a source set. */
 #include <cstdio>
 #include <cstdlib>

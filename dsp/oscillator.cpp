@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Tone generator with a whole-sample period: square, sawtooth or sine. */
 #include <cmath>
 #include <cstdio>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Linear-interpolating stereo resampler on a 4.28 fixed-point position, and 4.28 helpers. */
 #include <climits>
 #include <cstdint>

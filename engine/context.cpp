@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Engine context: format check, creation and release.
 #include <cmath>
 #include <cstdint>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Helpers shared by the engine's source files. Not exported. Add to this file; do not rename. */
 #ifndef KOVA_ENGINE_INTERNAL_H
 #define KOVA_ENGINE_INTERNAL_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Editing a registered set: its filters (replace, attach, read back) and its PCM files, each
 // followed by rebuilding every working copy from the unfiltered samples.
 #include <cmath>

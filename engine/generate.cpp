@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Generation entry points: argument checks, stroke state, start and end sounds.
 #include <cmath>
 #include <cstdint>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Internal pieces shared by the generation files: the per-call block setup and the sample
  * finisher (equaliser, rotating clip values). Not exported.
  *

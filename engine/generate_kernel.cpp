@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The sample kernel of every action: two passes per chunk. The first has no dependency from one
 // sample to the next (gain, envelope, oscillator, panning, truncation, normalisation) and is
 // written so the compiler vectorises it; the second is the serial part (equaliser, clipping,

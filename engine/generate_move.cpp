@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Move events: speed envelope, fast-move reset, the loop block and the optional pitch raise.
 #include <cfloat>
 #include <cmath>

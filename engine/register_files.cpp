@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Registration of a source set from raw PCM files, selection of the active set, set count.
 #include "engine/engine_internal.h"
 #include "kova/kova_dsp.h"

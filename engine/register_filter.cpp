@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Registration of a source set whose loop sound is white noise shaped by one filter.
 #include "engine/engine_internal.h"
 #include "kova/kova_dsp.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Registration of a source set read back from a source-set file.
 #include "engine/engine_internal.h"
 #include "kova/kova_engine.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Repeat points of a set's sources, converted between bytes and milliseconds.
 #include <climits>
 #include <cstring>

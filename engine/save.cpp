@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Saving a registered source set to a source-set file.
 #include <cstring>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Tuning controls: a set's tune set, the active set's thickness and the output volume.
 #include <cstdint>
 

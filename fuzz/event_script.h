@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The byte language of the generation fuzz target: an engine format, a sound source and a
 // sequence of operations (motion events with a buffer size each, tune set, thickness, volume,
 // set management). The decoder lives in the target; ScriptWriter writes the same layout, so the

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The byte language of the file fuzz targets: a file built from chunks, so that an input of a
 // few hundred bytes can stand for a source-set file whose payloads reach the slot limits
 // (38400/192000/38400 bytes) and beyond, while the bytes that matter (counts, records, sizes)

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The four engine-less queries on an arbitrary source-set file (the input in the chunk language
 // of file_script.h).
 //

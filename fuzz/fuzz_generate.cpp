@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Motion events, tune sets, thickness and volume values and set management decoded from the
 // input (see event_script.h) and run through kova_gen_sounds with output buffers of every size.
 // One engine context serves every input of the same format (reset in between).

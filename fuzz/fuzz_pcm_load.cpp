@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Raw PCM files of any content and length loaded into every slot, registered as a set of three
 // and played.
 //

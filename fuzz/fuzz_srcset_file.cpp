@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Registers a source set from an arbitrary source-set file (the input in the chunk language of
 // file_script.h), plays a short stroke with it, saves it and registers the saved file again;
 // then repeats the registration with an allocation failure injected somewhere along the way.

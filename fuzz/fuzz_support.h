@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Helpers shared by the fuzz targets and the seed-corpus generator: a byte reader over the fuzz
 // input, scratch files, a guarded output buffer and a checked stroke through kova_gen_sounds.
 #ifndef KOVA_FUZZ_SUPPORT_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Writes the seed corpora of the fuzz targets, made by the library itself:
 //   OUT/srcset    source-set files saved through the engine: 0 to 4 filters times every
 //                 combination of present slots, and files whose payloads sit at, just below and

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Plays what the track's callback supplies on a sound device through ALSA.
  *
  * The track's own timer paces the bursts (the sink reports itself unpaced), and the sink keeps

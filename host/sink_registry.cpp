@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "sink_registry.h"
 
 #include "track_thread.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Internal to the host audio library: sink selection, counters and the one-shot open failure. */
 #ifndef KOVA_HOST_SINK_REGISTRY_H
 #define KOVA_HOST_SINK_REGISTRY_H

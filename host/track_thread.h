@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Internal to the host audio library: the callback thread of one track. */
 #ifndef KOVA_HOST_TRACK_THREAD_H
 #define KOVA_HOST_TRACK_THREAD_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Low-latency output stream: a fast AudioTrack whose callback drains a ring buffer that the
  * generating side fills with whole blocks. */
 #include "kova/android/kova_fasttrack.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Internals shared by the registry and the Java native methods. Not exported. */
 #ifndef KOVA_JNI_INTERNAL_H
 #define KOVA_JNI_INTERNAL_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Library load and unload hooks and the Java methods that create and destroy an instance. */
 #include <unistd.h>
 

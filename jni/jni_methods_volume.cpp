@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Java methods that read the output volume tables; they touch no instance and take no lock. */
 #include <algorithm>
 #include <array>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* The per-process instance registry: 20 slots, the registry lock and the teardown sweeps. */
 #include "jni/jni_internal.h"
 #include "kova/kova_engine.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Single-producer single-consumer byte queue of power-of-two size; one byte always stays free so
  * that equal indices mean empty. No lock inside: the owning stream serialises every call. */
 #include <string.h>

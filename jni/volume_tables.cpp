@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Per-device output volume tables, exported as writable initialised data. Each device table is 14
  * rows of 17 floats; every row is one of the 21 curves below: 16 step values and a factor, or 8
  * step values, the factor and zero padding. */

@@ -1,4 +1,5 @@
 #!/usr/bin/env bash
+# SPDX-License-Identifier: Apache-2.0
 # Cross-builds the library and its native tests for AArch64 (Debian's aarch64-linux-gnu GCC and the
 # arm64 multiarch packages), runs the tests under qemu-user, and exchanges source-set files with
 # the x86-64 build: a file written on one machine must read back byte for byte the same on the

@@ -1,4 +1,5 @@
 #!/usr/bin/env bash
+# SPDX-License-Identifier: Apache-2.0
 # Builds the benchmarks in Release (build-bench/) and runs them: the native comparison benchmark
 # (kova_bench, with repetitions; the summary tables at the end give medians and ratios) and the
 # Java benchmark of gen_tofasttrack. Figures are noisy on a busy machine: check `uptime` first.

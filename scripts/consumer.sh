@@ -1,4 +1,5 @@
 #!/usr/bin/env bash
+# SPDX-License-Identifier: Apache-2.0
 # Uses the library as a native developer would, from a finished build (default: build):
 #   1. installs it into a temporary prefix and checks the SONAME and that nothing points into the
 #      build tree;

@@ -1,4 +1,5 @@
 #!/usr/bin/env bash
+# SPDX-License-Identifier: Apache-2.0
 # Hear and see a stroke: installs what is missing, builds the kova tool, and renders the built-in
 # gesture (three strokes with pauses) through the built-in source set into out/stroke.wav and its
 # picture out/stroke.png. Extra arguments go to `kova render`, e.g. scripts/demo.sh --gain 0.5

@@ -1,4 +1,5 @@
 #!/usr/bin/env bash
+# SPDX-License-Identifier: Apache-2.0
 # Installs, once, the Debian packages listed in scripts/packages.txt. Safe to run again.
 # Entries of the form NAME:ARCH (e.g. android-liblog-dev:arm64) are taken from a foreign
 # architecture; that architecture is enabled in dpkg first, once.

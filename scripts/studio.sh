@@ -1,4 +1,5 @@
 #!/usr/bin/env bash
+# SPDX-License-Identifier: Apache-2.0
 # The browser studio: the engine compiled to WebAssembly with emscripten, and the page around it.
 #   scripts/studio.sh            build into build-studio/site/ and serve it on 127.0.0.1 (prints
 #                                the address; KOVA_STUDIO_PORT, default 8780)

@@ -1,4 +1,5 @@
 #!/usr/bin/env bash
+# SPDX-License-Identifier: Apache-2.0
 # Runs every test suite and reliability gate:
 #   1. setup: installs what is missing;
 #   2. plain build + CTest, then valgrind's leak check over the allocation-failure suite and a
@@ -34,6 +35,13 @@ skipped() { [[ "$skip" == *" $1 "* ]] && { echo "== $1: skipped (KOVA_SKIP)"; re
 
 scripts/setup.sh
 stage_done "setup"
+
+# Every source file carries its licence line (checked only in a git checkout).
+if git rev-parse --git-dir >/dev/null 2>&1; then
+    unlicensed=$(git ls-files -- '*.c' '*.cpp' '*.h' '*.java' '*.js' '*.py' '*.sh' '*.cmake' \
+        '*CMakeLists.txt' | xargs grep -L 'SPDX-License-Identifier' || true)
+    [ -z "$unlicensed" ] || { echo "no SPDX-License-Identifier line in:"; echo "$unlicensed"; exit 1; }
+fi
 
 run_suite() {
     local dir=$1

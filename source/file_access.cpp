@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // File-access layer: eight operations over a POSIX descriptor, reached only through a TARQ_MFAL
 // filled by tarq_mfal_init.
 #include <fcntl.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Queries that read single items out of a saved source-set file, without an engine.
 //
 // Results: 0 once the file was opened; -3 for a null path or output, or a file that cannot be

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Loading raw PCM files (no header) into KOVA_SRC records, and a plain bounded file read.
 #include <algorithm>
 #include <cstring>

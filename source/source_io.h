@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Internal helpers shared by the PCM loader, the source-set reader/writer and the file queries.
 #ifndef KOVA_SOURCE_IO_H
 #define KOVA_SOURCE_IO_H

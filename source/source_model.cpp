@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Release and descriptor operations on the in-memory source model.
 #include <cstring>
 

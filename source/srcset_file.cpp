@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Writing a whole source set to a file and reading it back.
 //
 // A source-set file comes from outside and may be truncated, corrupted or hostile. The reader

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Readers and writers of the records of a source-set file. Each takes the open handle and the
 // access object through which it does its I/O. Writers build the stored image in a zeroed buffer,
 // so padding bytes and the reference words of a source record are always 0 and a saved file

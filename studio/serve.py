@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Serves the built studio on 127.0.0.1 with the headers that give the page shared memory
 (cross-origin isolation), which the AudioWorklet's ring buffer needs."""
 import functools

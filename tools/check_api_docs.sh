@@ -1,4 +1,5 @@
 #!/usr/bin/env bash
+# SPDX-License-Identifier: Apache-2.0
 # Checks that the API reference names every exported symbol: each C or C++ function and global
 # of the export list must be a documented member in Doxygen's XML index, and each Java entry
 # point a native method of the Java class (whose comments javac checks with -Xdoclint:all).

@@ -1,4 +1,5 @@
 #!/usr/bin/env bash
+# SPDX-License-Identifier: Apache-2.0
 # Compares the dynamic symbols a shared library defines with the expected list.
 # Usage: check_exports.sh LIBRARY EXPECTED_LIST
 set -euo pipefail

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "kova/kova_list.h"
 
 #include "kova_mem.h"

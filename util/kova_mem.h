@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Every heap allocation of the library goes through these, so tests can count allocations on a
  * path and make the n-th allocation fail. Not exported. */
 #ifndef KOVA_MEM_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /**
  * @file kova.h
  * @brief The whole C interface of libKovaFastTrack: include this one header.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /**
  * @file kova_dsp.h
  * @brief Signal blocks: oscillator, thickness equaliser, biquad filters, noise sources,

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /**
  * @file kova_engine.h
  * @brief The synthesis engine: context lifecycle, generation, registration, tuning, repeat

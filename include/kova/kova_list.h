@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /**
  * @file kova_list.h
  * @brief Doubly linked list of untyped payloads with head and tail sentinels; positions are

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /**
  * @file kova_output.h
  * @brief Low-latency output helpers usable from C: the ring buffer and the per-device volume

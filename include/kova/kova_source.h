@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /**
  * @file kova_source.h
  * @brief Sound sources: the source model, PCM loading, the file-access layer, the source-set

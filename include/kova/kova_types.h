@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /**
  * @file kova_types.h
  * @brief Records, constants and error codes shared by every module.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /**
  * @file kova_version.h
  * @brief Version of the libKovaFastTrack headers.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 import com.corvane.audio.Kova;
 import java.io.IOException;
 import java.nio.ByteBuffer;

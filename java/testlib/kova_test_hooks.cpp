@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Test-only JNI library: lets the Java tests see what the stand-in audio device received and
  * which lines the library wrote to the Android log. Loaded before libKovaFastTrack, so its logger
  * is in place when the library's load hook runs. */

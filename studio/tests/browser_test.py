@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Browser tests of the studio: the page in headless Chromium against the native library.
 
 1. generate() equals the native library's bytes for the same saved set and events;

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The page's first set: the very same built-in set as `kova render` (the tool's own code).
 #include <kova/kova.h>
 

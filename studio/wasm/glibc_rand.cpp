@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // rand() and srand() with the generator of the GNU C library (the additive feedback generator
 // r[i] = r[i-3] + r[i-31] behind its default random()), replacing the C library's own in the
 // WebAssembly build: the engine's white-noise sources call rand(), so the page's noise, like the

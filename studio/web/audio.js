@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Sound out: an AudioContext at the engine's rate, an AudioWorklet fed through the shared ring
 // (or posted blocks where the page has no shared memory), and an analyser for the strip.
 import { SampleRing } from "./ring.js";

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The engine in the page: the library's C functions, compiled to WebAssembly, behind a small
 // JavaScript face. Record layouts are those of the 32-bit build.
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Single-producer single-consumer queue of 16-bit samples over shared memory: the page writes the
 // engine's blocks, the audio worklet reads them. Indices only grow (wrapping at 2^32) and are
 // published with Atomics, so neither side ever blocks the other.

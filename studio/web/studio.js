@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The studio page: draw a stroke and hear the engine play it, shape the set while listening, save
 // it as a source-set file and open one.
 import {

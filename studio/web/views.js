@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Pictures: the strip of what was played (waveform above, spectrogram below, scrolling left) and
 // the frequency responses of the set's filters.
 import { FILTER_TYPES } from "./engine.js";

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Plays the engine's interleaved 16-bit blocks as they arrive: from the shared ring when the page
 // is cross-origin isolated, else from blocks posted to the port. Reports what it played.
 import { SampleRing } from "./ring.js";

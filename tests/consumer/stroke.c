@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* A program that uses the installed library the way an application does: writes three raw PCM
  * sounds, registers them, and renders a touch-down and one 16 ms move. Prints the header version
  * so the caller can compare it with the package's. Exit status 0 only when the move rendered 16 ms

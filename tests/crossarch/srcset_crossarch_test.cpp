@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Source-set files are portable between the machines the library runs on: a file written on
 // x86-64 reads back on AArch64 exactly as on the machine that wrote it, and the other way round.
 //

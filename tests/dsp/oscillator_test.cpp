@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The oscillator: periods, waveforms, the sample-block writer, refusals, and the block fill
 // (_osc_fill), which must hand out exactly what the same number of single calls would and leave
 // the oscillator in the same state.

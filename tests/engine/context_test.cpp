@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Format check, context creation (including every allocation failing in turn) and release.
 #include <gtest/gtest.h>
 

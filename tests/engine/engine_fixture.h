@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Hand-built engine contexts and source sets for the engine tests (header-only).
 #ifndef KOVA_TESTS_ENGINE_FIXTURE_H
 #define KOVA_TESTS_ENGINE_FIXTURE_H

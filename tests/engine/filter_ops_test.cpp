@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Editing a registered set's filters and files; refusal of degenerate descriptors.
 #include <gtest/gtest.h>
 

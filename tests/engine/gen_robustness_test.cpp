@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Random events, tune values and repeat points: generation stays inside the caller's buffer and
 // returns an even, non-negative byte count no larger than the buffer.
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Generation: the worked move checked against a reference built from the documented per-sample
 // formulas, the pitch-raise path, clipping, panning, loop wrap, fast moves, the event rules, and
 // that no event allocates.

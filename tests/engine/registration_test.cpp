@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Registration by files, filter and saved file: identifiers, limits, defaults, failure paths.
 #include <fcntl.h>
 #include <gtest/gtest.h>

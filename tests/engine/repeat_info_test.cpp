@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Repeat points in milliseconds: conversions with known numbers, reading and storing them.
 #include <gtest/gtest.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Saving a set through the engine: the byte count of a set with only a loop, and the documented
 // refusals, which write nothing. The saved bytes themselves, and what the engine makes of them
 // when they are registered again, are checked against an independently encoded image by the

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Tune-set range rules and pairs, thickness and volume controls.
 #include <gtest/gtest.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The stream against the stand-in device: a writer thread feeds blocks at playback pace while the
 // device's thread pulls bursts; what the device received must be exactly the written blocks.
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Load and unload hooks, instance creation and destruction, and the life of the registry lock. */
 #include "jni/jni_test_support.h"
 #include "kova_host/audio_sink.h"

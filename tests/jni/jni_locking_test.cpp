@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Serialisation of the Java calls: the registry lock is held by every instance method, and deinit
  * destroying that lock while other threads are calling in leaves none of them with a dead mutex.
  * Run under ThreadSanitizer and AddressSanitizer builds as well. */

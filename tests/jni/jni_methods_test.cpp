@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* The control and generation methods through a fake JNI environment: results at the edges, log
  * lines, the pairing of JNI obtains and releases, and the blocks handed to the output stream. */
 #include "jni/jni_test_support.h"

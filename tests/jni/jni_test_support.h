@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Helpers for the tests of the Java-facing layer: a minimal JNI environment for calling the native
  * methods without a JVM (Java strings and arrays are test-owned objects, and every obtain/release
  * is counted so a test can check the pairing), the Java entry points, PCM source files and the

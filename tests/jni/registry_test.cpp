@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* The registry functions and the teardown sweeps, including how they treat a busy registry lock. */
 #include <errno.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The volume tables: the rows handed out (directly and through the Java methods), and the shape
 // and known curves of every device and situation row.
 #include <array>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Every operation that allocates, run with each of its allocations failing in turn, and whole
 // lifecycles run many times over: a failure is reported with the documented code, leaves what
 // existed intact, and gives back every byte. The heap in use is measured around each run (plain

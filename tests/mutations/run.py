@@ -1,4 +1,5 @@
 #!/usr/bin/env python3
+# SPDX-License-Identifier: Apache-2.0
 """Mutation check: applies each mutation of mutations.txt in turn to a scratch copy of the
 checkout, builds, runs the test suites and reports which tests caught it. By hand, not in CI:
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Several instances driven at once through the Java entry points, as an application with a few
 // views would: strokes with an event every 8 ms, stops and restarts of the output stream and
 // registrations in between, while each instance's device thread drains its stream.

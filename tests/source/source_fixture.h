@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Helpers for the sound-source tests: scratch files, a heap probe, hand-built source sets.
 #ifndef KOVA_TESTS_SOURCE_FIXTURE_H
 #define KOVA_TESTS_SOURCE_FIXTURE_H

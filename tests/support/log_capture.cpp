@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "support/log_capture.h"
 
 #include <android/log.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Records what the library sends to the Android log, for tests. */
 #ifndef KOVA_TEST_LOG_CAPTURE_H
 #define KOVA_TEST_LOG_CAPTURE_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* The tool's built-in source set: white noise through a band-pass from about 1 to 4 kHz as the
  * loop (the scratch of a pen on paper), the tool's own start and end sounds, and levels chosen so
  * a default render peaks a few dB below full scale. Depends only on the library's C API and the

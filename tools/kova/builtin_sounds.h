@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* The tool's own start and end sounds, synthesised in code so the built-in set needs no files. */
 #ifndef KOVA_TOOL_BUILTIN_SOUNDS_H
 #define KOVA_TOOL_BUILTIN_SOUNDS_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* What every subcommand of the kova tool shares: the error that ends a command with an exit code
  * and the tool's own output streams. */
 #ifndef KOVA_TOOL_CLI_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* The subcommands of the kova tool. Each adds itself to the command line and returns what runs
  * it with the parsed options; failures are thrown as ToolError. */
 #ifndef KOVA_TOOL_COMMANDS_H

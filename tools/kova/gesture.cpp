@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "gesture.h"
 
 #include <kova/kova_types.h>

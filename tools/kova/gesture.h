@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Touch gestures: the events a stroke produces, read from CSV or built in. */
 #ifndef KOVA_TOOL_GESTURE_H
 #define KOVA_TOOL_GESTURE_H

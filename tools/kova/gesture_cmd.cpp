@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "commands.h"
 #include "gesture.h"
 #include "output_file.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Opening what the tool reads: regular files only, never blocking, whole reads bounded. */
 #ifndef KOVA_TOOL_INPUT_FILE_H
 #define KOVA_TOOL_INPUT_FILE_H

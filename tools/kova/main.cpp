@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* kova: hear and see what a stroke sounds like, and shape source sets offline, through the
  * exported C interface of libKovaFastTrack. */
 #include <CLI/CLI.hpp>

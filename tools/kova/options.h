@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Command-line options shared by render, play and save (CLI11), and their cross-checks. Every
  * check names the bad value and the accepted range. */
 #ifndef KOVA_TOOL_OPTIONS_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* A file that appears under its name only once it is complete: written to a temporary file in
  * the same folder and renamed over the target on commit. A failed or interrupted command leaves
  * an existing file of that name untouched and no partial file behind. A symbolic link is written

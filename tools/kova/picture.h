@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* A PNG picture of rendered sound: the waveform of each channel over a strip that marks where the
  * start, loop and end blocks lie, and a spectrogram below, on a shared time axis. */
 #ifndef KOVA_TOOL_PICTURE_H

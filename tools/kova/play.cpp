@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include <kova/android/kova_fasttrack.h>
 #include <kova/kova_output.h>
 #include <kova_host/audio_sink.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "savefile_check.h"
 
 #include <kova/kova_types.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* A plausibility check of a source-set file before the library reads it. The file has no magic
  * number, so any file would be read as one; this catches the files whose counts and sizes cannot
  * come from a saved set, which would otherwise make the reader loop or allocate without bound. */

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* A private temporary folder for PCM that the engine must read from files (it registers sounds
  * from files only). Standard C++ only, so the browser build can use it too (emscripten's file
  * system is in memory). */

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Sound files for the start, loop and end slots, in the engine's format. */
 #ifndef KOVA_TOOL_SOUND_INPUT_H
 #define KOVA_TOOL_SOUND_INPUT_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* An engine context with the source set that the command line describes. */
 #ifndef KOVA_TOOL_SOURCES_H
 #define KOVA_TOOL_SOURCES_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Where rendered blocks land in the output, the way the live stream plays them: blocks queue one
  * after another like in the stream's ring buffer, and where the queue runs dry (a pause between
  * strokes) the output is silent until the next event's own time. */

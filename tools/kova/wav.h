@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* 16-bit PCM WAV output through libsndfile. */
 #ifndef KOVA_TOOL_WAV_H
 #define KOVA_TOOL_WAV_H

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Command line of the kova tool: help, exit codes, and that bad values are named with their
  * accepted range and leave existing files alone. */
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* kova play on a machine without the named sound device: it says so, and --capture still runs the
  * stream in real time and writes what the device would have received. */
 #include <fcntl.h>

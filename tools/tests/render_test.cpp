@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* kova render: the WAV file read back with libsndfile, the PNG read back with cairo. */
 #include <cairo.h>
 #include <sndfile.h>

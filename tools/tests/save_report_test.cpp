@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* kova save and kova inspect: a saved set read back through the file queries, as JSON. */
 #include <gtest/gtest.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Where the host stand-in of android::AudioTrack sends what its callback supplied.
  *
  * The selection applies to tracks created after the call; tracks already open keep their sink.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Host stand-in for the platform's android::AudioTrack: the subset the fast-track stream uses.
  *
  * A track created with a callback owns a thread that, once started, asks the callback for a fixed

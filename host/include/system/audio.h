@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Host stand-in: the few audio types and constants of the platform that the output stream uses.
  * Values match the platform's, so the same calls compile and mean the same on a device. */
 #ifndef KOVA_HOST_SYSTEM_AUDIO_H

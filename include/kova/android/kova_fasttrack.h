@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /**
  * @file kova_fasttrack.h
  * @brief Fast-track output stream: an `android::AudioTrack` opened with the fast flag and a pull

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /**
  * @file kova_registry.h
  * @brief Per-process instance registry behind the Java class `com.corvane.audio.Kova`.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Running the kova binary from tests, and the files around it. */
 #ifndef KOVA_TOOL_TESTS_TOOL_RUN_H
 #define KOVA_TOOL_TESTS_TOOL_RUN_H
