@@ -27,8 +27,10 @@ double scaled(uint8_t b, double lo, double hi) {
 // full-scale square wave that drives the clipper. Written to `out` (`bytes` long). Neither
 // instrumented nor checked: a per-sample loop of the harness, not of the library, and the ramp is
 // a table per amplitude, so the up to 131070 samples of a loop file cost little.
-__attribute__((no_sanitize("coverage", "address", "undefined"))) void make_pcm(
-    uint8_t* out, size_t bytes, uint8_t amplitude, uint32_t seed) {
+__attribute__((no_sanitize("coverage", "address", "undefined"))) void make_pcm(uint8_t* out,
+                                                                               size_t bytes,
+                                                                               uint8_t amplitude,
+                                                                               uint32_t seed) {
     int32_t ramp[200];
     for (int32_t j = 0; j < 200; ++j) ramp[j] = (j * 300 - 30000) * amplitude / 255;
     uint32_t x = seed | 1;
