@@ -15,11 +15,20 @@ constexpr size_t kMaxEntries = 16;
 
 void keep_payload(void*) {}
 
+// Keys are told apart by hash first: a string comparison that fails goes through the memcmp
+// hook, and libFuzzer would learn the key bytes as input words.
+uint64_t hash_of(const std::string& key) {
+    uint64_t h = 14695981039346656037u;  // FNV-1a
+    for (const char c : key) h = (h ^ static_cast<uint8_t>(c)) * 1099511628211u;
+    return h;
+}
+
 }  // namespace
 
 // A kept set and the images of everything an input can change in it.
 struct SetCache::Entry {
     std::string key;
+    uint64_t hash = 0;
     KOVA_SRCSET* set = nullptr;
     bool in_use = false;
     uint64_t last_used = 0;
@@ -40,8 +49,9 @@ SetCache::~SetCache() {
 
 int32_t SetCache::reuse(KOVA_CTX* ctx, const std::string& key) {
     LIST* sets = ctx->src_list;
+    const uint64_t hash = hash_of(key);
     for (const auto& e : entries_) {
-        if (e->key != key) continue;
+        if (e->hash != hash || e->key != key) continue;
         if (e->in_use || sets->count >= KOVA_MAX_SRCSETS) return 0;
         if (list_pushback(sets, e->set) == nullptr) return 0;
         e->in_use = true;
@@ -54,8 +64,10 @@ int32_t SetCache::reuse(KOVA_CTX* ctx, const std::string& key) {
 
 void SetCache::keep(KOVA_CTX* ctx, int32_t id, const std::string& key) {
     if (id < 1) return;
+    const uint64_t hash = hash_of(key);
     for (const auto& e : entries_) {
-        if (e->key == key) return;  // the kept one is in use: this set stays the input's own
+        if (e->hash == hash && e->key == key)
+            return;  // the kept one is in use: this set stays the input's own
     }
     if (entries_.size() >= kMaxEntries) {
         auto oldest = entries_.end();
@@ -70,6 +82,7 @@ void SetCache::keep(KOVA_CTX* ctx, int32_t id, const std::string& key) {
     }
     auto e = std::make_unique<Entry>();
     e->key = key;
+    e->hash = hash;
     e->set =
         static_cast<KOVA_SRCSET*>(list_getat(ctx->src_list, static_cast<uint32_t>(id - 1))->data);
     e->in_use = true;
