@@ -261,7 +261,7 @@ class Session {
     bool costly() { return costly_left_-- > 0; }
 
    private:
-    static constexpr int64_t kOutputBudget = 32 * 1024;
+    static constexpr int64_t kOutputBudget = 16 * 1024;
     static constexpr int32_t kCappedBuffer = 512;
     int64_t output_left_ = kOutputBudget;
     int costly_left_ = 2;

@@ -10,8 +10,9 @@ namespace kova_fuzz {
 
 namespace {
 
-// Enough for the few keys a corpus's inputs share; each holds up to about 800 KB.
-constexpr size_t kMaxEntries = 16;
+// Enough for the keys of the corpus entries libFuzzer mutates in turn; each holds up to about
+// 800 KB.
+constexpr size_t kMaxEntries = 48;
 
 void keep_payload(void*) {}
 
@@ -69,6 +70,7 @@ void SetCache::keep(KOVA_CTX* ctx, int32_t id, const std::string& key) {
         if (e->hash == hash && e->key == key)
             return;  // the kept one is in use: this set stays the input's own
     }
+    std::unique_ptr<Entry> spare;
     if (entries_.size() >= kMaxEntries) {
         auto oldest = entries_.end();
         for (auto it = entries_.begin(); it != entries_.end(); ++it) {
@@ -78,9 +80,13 @@ void SetCache::keep(KOVA_CTX* ctx, int32_t id, const std::string& key) {
         }
         if (oldest == entries_.end()) return;
         kova_free_sourceset((*oldest)->set);
+        spare = std::move(*oldest);  // its copies' memory serves the new set (no new pages)
         entries_.erase(oldest);
     }
     auto e = std::make_unique<Entry>();
+    if (spare != nullptr) {
+        for (int slot = 0; slot < KOVA_SLOT_COUNT; ++slot) e->proc[slot].swap(spare->proc[slot]);
+    }
     e->key = key;
     e->hash = hash;
     e->set =
@@ -96,6 +102,7 @@ void SetCache::keep(KOVA_CTX* ctx, int32_t id, const std::string& key) {
         if (src == nullptr) continue;
         e->src[slot] = *src;
         const auto* p = reinterpret_cast<const uint8_t*>(src->pcm_proc);
+        e->proc[slot].clear();
         if (p != nullptr && src->size > 0) e->proc[slot].assign(p, p + src->size);
     }
     entries_.push_back(std::move(e));
