@@ -119,8 +119,9 @@ void SetCache::release(KOVA_CTX* ctx) {
             e.in_use = false;
             // A set whose parts were replaced (a file set's sources are read again when its
             // filters change) is no longer the registered one: it is released.
-            const bool same = std::memcmp(e.set->src, e.image.src, sizeof e.image.src) == 0 &&
-                              e.set->filters == e.image.filters && e.set->tune == e.image.tune;
+            bool same = e.set->filters == e.image.filters && e.set->tune == e.image.tune;
+            for (int slot = 0; slot < KOVA_SLOT_COUNT; ++slot)
+                same = same && e.set->src[slot] == e.image.src[slot];
             if (same) {
                 restore(e);
             } else {
