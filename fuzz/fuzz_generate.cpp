@@ -10,10 +10,11 @@
 // that does not continue an open stroke produces nothing.
 #include <cstdint>
 #include <cstring>
-#include <vector>
+#include <string>
 
 #include "event_script.h"
 #include "fuzz_support.h"
+#include "set_cache.h"
 
 using namespace kova_fuzz;
 
@@ -24,29 +25,32 @@ double scaled(uint8_t b, double lo, double hi) {
 }
 
 // Deterministic PCM for a file source: a ramp with a little noise; amplitude 255 gives a
-// full-scale square wave that drives the clipper. Not instrumented: a per-sample loop of the
-// harness, not of the library.
-__attribute__((no_sanitize("coverage"))) std::vector<uint8_t> make_pcm(size_t bytes,
-                                                                       uint8_t amplitude,
-                                                                       uint32_t seed) {
-    std::vector<uint8_t> pcm(bytes);
+// full-scale square wave that drives the clipper. Written to `out` (`bytes` long). Neither
+// instrumented nor checked: a per-sample loop of the harness, not of the library, and the ramp is
+// a table per amplitude, so the up to 131070 samples of a loop file cost little.
+__attribute__((no_sanitize("coverage", "address", "undefined"))) void make_pcm(uint8_t* out,
+                                                                               size_t bytes,
+                                                                               uint8_t amplitude,
+                                                                               uint32_t seed) {
+    int32_t ramp[200];
+    for (int32_t j = 0; j < 200; ++j) ramp[j] = (j * 300 - 30000) * amplitude / 255;
     uint32_t x = seed | 1;
-    for (size_t i = 0; i + 1 < bytes; i += 2) {
+    size_t phase = 0;
+    for (size_t n = 0; n < bytes / 2; ++n) {
         x ^= x << 13;
         x ^= x >> 17;
         x ^= x << 5;
         int32_t v;
         if (amplitude == 255) {
-            v = (i / 2 / 37) % 2 ? 32767 : -32768;
+            v = (n / 37) % 2 ? 32767 : -32768;
         } else {
-            v = static_cast<int32_t>((i / 2 % 200) * 300 - 30000) * amplitude / 255 +
-                static_cast<int32_t>(x % 512) - 256;
+            v = ramp[phase] + static_cast<int32_t>(x % 512) - 256;
         }
+        if (++phase == 200) phase = 0;
         const auto s = static_cast<int16_t>(v < -32768 ? -32768 : (v > 32767 ? 32767 : v));
-        std::memcpy(&pcm[i], &s, 2);
+        std::memcpy(out + 2 * n, &s, 2);
     }
-    if (bytes % 2) pcm[bytes - 1] = 0x11;
-    return pcm;
+    if (bytes % 2) out[bytes - 1] = 0x11;
 }
 
 KOVA_FLT_DSC read_filter(Bytes& in, const KOVA_FORMAT& f) {
@@ -58,6 +62,66 @@ KOVA_FLT_DSC read_filter(Bytes& in, const KOVA_FORMAT& f) {
     d.samplerate = static_cast<int32_t>(f.sample_rate);
     d.channels = static_cast<int32_t>(f.channels);
     return d;
+}
+
+// The three PCM files of a file source. Their content follows from the lengths and amplitude
+// an input gives; they are written only when the library is about to read them (a registration
+// the cache does not serve, a filter change that reloads them) and differ from what is on disk.
+class PcmFiles {
+   public:
+    void want(const size_t (&lengths)[KOVA_SLOT_COUNT], uint8_t amplitude) {
+        std::memcpy(wanted_, lengths, sizeof wanted_);
+        amplitude_ = amplitude;
+    }
+    void sync() {
+        static uint8_t pcm[size_t{UINT16_MAX} * 4];
+        for (int slot = 0; slot < KOVA_SLOT_COUNT; ++slot) {
+            if (written_[slot] == wanted_[slot] && written_amplitude_ == amplitude_) continue;
+            make_pcm(pcm, wanted_[slot], amplitude_, 7u + slot);
+            files_[slot].rewrite(pcm, wanted_[slot]);
+            written_[slot] = wanted_[slot];
+        }
+        written_amplitude_ = amplitude_;
+    }
+    const char* const* paths() {
+        for (int slot = 0; slot < KOVA_SLOT_COUNT; ++slot) paths_[slot] = files_[slot].path();
+        return paths_;
+    }
+
+   private:
+    const ScratchFile files_[KOVA_SLOT_COUNT] = {ScratchFile("gen-start"), ScratchFile("gen-loop"),
+                                                 ScratchFile("gen-end")};
+    size_t wanted_[KOVA_SLOT_COUNT] = {};
+    size_t written_[KOVA_SLOT_COUNT] = {SIZE_MAX, SIZE_MAX, SIZE_MAX};
+    uint8_t amplitude_ = 0;
+    uint8_t written_amplitude_ = 0;
+    const char* paths_[KOVA_SLOT_COUNT] = {};
+};
+
+PcmFiles& pcm_files() {
+    static PcmFiles files;
+    return files;
+}
+
+SetCache& kept_sets() {
+    static SetCache sets;
+    return sets;
+}
+
+// Registers a set: the kept one for `key` when there is one, else `make()` (the library's
+// registration, or -1 when it is skipped), whose set is then kept. Not instrumented: which way
+// it went is the cache's business, not behaviour of the library.
+template <typename Make>
+__attribute__((no_sanitize("coverage"))) int32_t register_kept(KOVA_CTX* ctx, const std::string& key, Make make) {
+    int32_t id = kept_sets().reuse(ctx, key);
+    if (id != 0) return id;
+    id = make();
+    kept_sets().keep(ctx, id, key);
+    return id;
+}
+
+std::string noise_key(const KOVA_FORMAT& f, const KOVA_FLT_DSC& d) {
+    return "noise" + key_bytes(f) + key_bytes(d);
 }
 
 class Session {
@@ -145,20 +209,27 @@ class Session {
             }
             case kAdminRegFilter: {
                 const KOVA_FLT_DSC d = read_filter(in, format_);
-                if (!costly()) break;
-                const int32_t id = kova_reg_src_byfilter(ctx_, &d, &err);
+                // A kept set costs nothing; only a registration by the library counts.
+                const int32_t id = register_kept(ctx_, noise_key(format_, d), [&] {
+                    return costly() ? kova_reg_src_byfilter(ctx_, &d, &err) : -1;
+                });
+                if (id < 0) break;
                 FUZZ_CHECK(id == 0 ? kova_get_src_num(ctx_) == count : id == count + 1);
                 break;
             }
             case kAdminAttach: {
                 const KOVA_FLT_DSC d = read_filter(in, format_);
                 if (!costly()) break;
+                pcm_files().sync();  // a file set reads its files again
+                kept_sets().edited();
                 kova_attach_filter(ctx_, count, &d, &err);
                 break;
             }
             case kAdminUpdate: {
                 const KOVA_FLT_DSC d = read_filter(in, format_);
                 if (!costly()) break;
+                pcm_files().sync();  // a file set reads its files again
+                kept_sets().edited();
                 kova_update_filter(ctx_, count, &d, &err);
                 break;
             }
@@ -183,14 +254,15 @@ class Session {
         }
     }
 
-    // Registering a noise source, filtering a set again or saving and reading it back works
-    // through up to 270 KB of samples (about a millisecond here, several times a cheap input):
-    // two per input (a noise source as the first set counts), further ones are skipped, so such
-    // inputs cannot dominate the run. Their order with everything else still varies.
+    // Registering a noise source the cache does not hold, filtering a set again or saving and
+    // reading it back works through up to 270 KB of samples (about a millisecond here, several
+    // times a cheap input): two per input (a noise source made for the first set counts),
+    // further ones are skipped, so such inputs cannot dominate the run. Their order with
+    // everything else still varies.
     bool costly() { return costly_left_-- > 0; }
 
    private:
-    static constexpr int64_t kOutputBudget = 32 * 1024;
+    static constexpr int64_t kOutputBudget = 16 * 1024;
     static constexpr int32_t kCappedBuffer = 512;
     int64_t output_left_ = kOutputBudget;
     int costly_left_ = 2;
@@ -201,28 +273,19 @@ class Session {
     Stroke stroke_ = Stroke::kClosed;
 };
 
-bool register_files(Bytes& in, KOVA_CTX* ctx) {
-    static const ScratchFile files[KOVA_SLOT_COUNT] = {
-        ScratchFile("gen-start"), ScratchFile("gen-loop"), ScratchFile("gen-end")};
+bool register_files(Bytes& in, KOVA_CTX* ctx, const KOVA_FORMAT& f) {
     const size_t start = in.take<uint16_t>();
     const size_t loop = static_cast<size_t>(in.take<uint16_t>()) * 4;
     const size_t end = in.take<uint16_t>();
     const uint8_t amplitude = in.take<uint8_t>();
     const size_t lengths[KOVA_SLOT_COUNT] = {start, loop, end};
-    // The files depend on length and amplitude only; most inputs keep the previous ones.
-    static size_t written_length[KOVA_SLOT_COUNT] = {SIZE_MAX, SIZE_MAX, SIZE_MAX};
-    static uint8_t written_amplitude = 0;
-    const char* paths[KOVA_SLOT_COUNT];
-    for (int slot = 0; slot < KOVA_SLOT_COUNT; ++slot) {
-        paths[slot] = files[slot].path();
-        if (written_length[slot] == lengths[slot] && written_amplitude == amplitude) continue;
-        const std::vector<uint8_t> pcm = make_pcm(lengths[slot], amplitude, 7u + slot);
-        files[slot].rewrite(pcm.data(), pcm.size());
-        written_length[slot] = lengths[slot];
-    }
-    written_amplitude = amplitude;
-    int32_t err = 0;
-    const int32_t id = kova_reg_src_byfiles(ctx, paths, &err);
+    pcm_files().want(lengths, amplitude);
+    const std::string key = "files" + key_bytes(f) + key_bytes(lengths) + key_bytes(amplitude);
+    const int32_t id = register_kept(ctx, key, [&] {
+        pcm_files().sync();
+        int32_t err = 0;
+        return kova_reg_src_byfiles(ctx, pcm_files().paths(), &err);
+    });
     FUZZ_CHECK((id == 1) == (loop > 0));
     return id == 1;
 }
@@ -249,19 +312,28 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
         FUZZ_CHECK(kova_checkformat(&f) < 1 && engine.init_error() == KOVA_ERR_INVALID_FORMAT);
         return 0;
     }
+    // The kept sets leave the context before it is reset (locals end in reverse order).
+    struct Release {
+        KOVA_CTX* ctx;
+        ~Release() { kept_sets().release(ctx); }
+    } const release{ctx};
     int32_t err = 0;
 
     // 0, 1, 2 as in event_script.h; any other value means files (a noise source costs about a
     // millisecond to make, so random kinds must not turn most inputs into filter inputs).
     const uint8_t kind_byte = in.take<uint8_t>();
     const uint8_t kind = kind_byte <= kSourceBoth ? kind_byte : uint8_t{kSourceFiles};
-    if (kind == kSourceFiles || kind == kSourceBoth) register_files(in, ctx);
+    if (kind == kSourceFiles || kind == kSourceBoth) register_files(in, ctx, f);
+    bool made_noise = false;
     if (kind == kSourceFilter || kind == kSourceBoth) {
         const KOVA_FLT_DSC d = read_filter(in, f);
-        kova_reg_src_byfilter(ctx, &d, &err);
+        register_kept(ctx, noise_key(f, d), [&] {
+            made_noise = true;
+            return kova_reg_src_byfilter(ctx, &d, &err);
+        });
     }
     Session session(ctx, f);
-    if (kind == kSourceFilter || kind == kSourceBoth) session.costly();
+    if (made_noise) session.costly();
     while (!in.empty()) {
         const uint8_t op = in.take<uint8_t>() % kOpCount;
         if (op < kOpTune) {
