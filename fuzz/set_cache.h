@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Source sets kept across the inputs of one fuzz target process. Registering a noise set makes
 // and filters 96000 samples, a file set reads up to 270 KB back from disk: about a millisecond
 // under the sanitizers, more than the rest of a typical input. A set's bytes depend only on what
