@@ -129,6 +129,28 @@ TEST_F(GenTest, PitchRaiseStagesAndResamples) {
               reference(loop, worked_ref(false), 1536, &end_pos));
 }
 
+// The longest, fastest move with the deepest pitch raise asks for 6.9 x 19104 staged samples;
+// only the 96000 of the staging buffer are staged (nothing written past it) and resampled.
+TEST_F(GenTest, PitchRaiseStagesNoMoreThanTheWorkBuffer) {
+    set->tune->sharp_enable = 1;
+    set->tune->sharpness = 1.0;
+    constexpr size_t kWork = KOVA_WORK_BUF_BYTES / 2;
+    std::vector<int16_t> guarded(kWork + 40000, 0x5A5A);
+    int16_t* const own = ctx->work_buf;
+    ctx->work_buf = guarded.data();
+    ASSERT_EQ(gen(ctx.get(), event(0, 0, 1000, KOVA_ACTION_START), buf), 0);
+    const int32_t bytes = gen(ctx.get(), event(5000, 0, 1199, KOVA_ACTION_MOVE), buf);
+    ctx->work_buf = own;
+    EXPECT_EQ(std::count(guarded.begin() + kWork, guarded.end(), 0x5A5A), 40000);
+    // 96000 staged samples from 48000 Hz to 2 * trunc(48000 / 6.9 / 2) = 6956 Hz.
+    std::vector<int16_t> want(20000);
+    const KOVA_PCMBUF in{guarded.data(), static_cast<int32_t>(kWork * 2)};
+    KOVA_PCMBUF out{want.data(), 0};
+    kova_resample_s16_stereo(48000, 6956, &in, &out);
+    ASSERT_EQ(bytes, out.size);
+    EXPECT_TRUE(std::equal(buf.begin(), buf.begin() + bytes / 2, want.begin()));
+}
+
 TEST_F(GenTest, LoopWrapsAtRepeatEnd) {
     ASSERT_EQ(gen(ctx.get(), event(100, 100, 1000, KOVA_ACTION_START), buf), 0);
     loop_src()->pos = 95990;  // 6 samples before the loop end 95996
