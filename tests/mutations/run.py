@@ -2,7 +2,7 @@
 """Mutation check: applies each mutation of mutations.txt in turn to a scratch copy of the
 checkout, builds, runs the test suites and reports which tests caught it. By hand, not in CI:
 
-    tests/mutations/run.py [--build DIR] [--only M03,M07] [--jobs N]
+    tests/mutations/run.py [--build DIR] [--only M03,M07] [--jobs N] [--head]
 
 A mutation that no test catches is reported as SURVIVED, one whose text is no longer in the code
 as STALE, one that does not compile as INVALID; any of these makes the script exit 1. The scratch
@@ -65,19 +65,21 @@ def run(cmd, cwd, log):
         return subprocess.run(cmd, cwd=cwd, stdout=out, stderr=subprocess.STDOUT).returncode
 
 
-def sync_tree(tree):
-    """Copies the checkout's files into `tree`, leaving files with equal content untouched and
-    removing files the checkout no longer has."""
+def sync_tree(tree, source):
+    """Copies the files of the checkout at `source` into `tree`, leaving files with equal content
+    untouched and removing files the checkout no longer has."""
     listed = subprocess.run(["git", "ls-files", "-z", "--cached", "--others", "--exclude-standard"],
-                            cwd=ROOT, check=True, capture_output=True).stdout
-    wanted = {p for p in listed.decode().split("\0") if p and os.path.isfile(os.path.join(ROOT, p))}
+                            cwd=source, check=True, capture_output=True).stdout
+    wanted = {p for p in listed.decode().split("\0") if p and os.path.isfile(os.path.join(source, p))}
     for rel in wanted:
-        src, dst = os.path.join(ROOT, rel), os.path.join(tree, rel)
+        src, dst = os.path.join(source, rel), os.path.join(tree, rel)
         data = open(src, "rb").read()
         if os.path.isfile(dst) and open(dst, "rb").read() == data:
+            shutil.copymode(src, dst)
             continue
         os.makedirs(os.path.dirname(dst), exist_ok=True)
         shutil.copyfile(src, dst)  # a fresh time stamp, so the build sees the change
+        shutil.copymode(src, dst)
     for base, _, files in os.walk(tree):
         for name in files:
             rel = os.path.relpath(os.path.join(base, name), tree)
@@ -104,6 +106,8 @@ def main():
     ap.add_argument("--build", default="/tmp/kova-mutations")
     ap.add_argument("--only", default="")
     ap.add_argument("--jobs", default=str(os.cpu_count() or 2))
+    ap.add_argument("--head", action="store_true",
+                    help="check the last commit, not the files on disk")
     args = ap.parse_args()
     muts = parse(os.path.join(HERE, "mutations.txt"))
     if args.only:
@@ -115,7 +119,18 @@ def main():
     log = os.path.join(args.build, "log.txt")
     os.makedirs(tree, exist_ok=True)
     open(log, "w").close()
-    sync_tree(tree)
+    if args.head:
+        # A throw-away checkout of HEAD (a detached worktree, removed again right after).
+        head = os.path.join(args.build, "head")
+        shutil.rmtree(head, ignore_errors=True)
+        subprocess.run(["git", "worktree", "add", "--detach", "-f", head, "HEAD"], cwd=ROOT,
+                       check=True, capture_output=True)
+        try:
+            sync_tree(tree, head)
+        finally:
+            subprocess.run(["git", "worktree", "remove", "--force", head], cwd=ROOT)
+    else:
+        sync_tree(tree, ROOT)
 
     started = time.time()
     print(f"baseline build in {build}", flush=True)
