@@ -40,11 +40,6 @@ TEST(RepeatInfo, FilterSetReportsOneSecondLoopAndEmptySlots) {
     EXPECT_EQ(info.len_ms[KOVA_SLOT_LOOP], 1000);
     EXPECT_EQ(info.rpt_start_ms[KOVA_SLOT_LOOP], 0);
     EXPECT_EQ(info.rpt_end_ms[KOVA_SLOT_LOOP], 1000);
-
-    EXPECT_EQ(kova_get_rptinfo(ctx, 2, &info), KOVA_ERR_INVALID_PARAM);
-    EXPECT_EQ(kova_get_rptinfo(ctx, 0, &info), KOVA_ERR_INVALID_PARAM);
-    EXPECT_EQ(kova_get_rptinfo(ctx, 1, nullptr), KOVA_ERR_INVALID_PARAM);
-    EXPECT_EQ(kova_get_rptinfo(nullptr, 1, &info), KOVA_ERR_INVALID_PARAM);
 }
 
 TEST(RepeatInfo, StoringKeepsValuesWithinTheSource) {
@@ -76,9 +71,4 @@ TEST(RepeatInfo, StoringKeepsValuesWithinTheSource) {
     EXPECT_EQ(out.len_ms[KOVA_SLOT_START], 50);
     EXPECT_EQ(out.rpt_start_ms[KOVA_SLOT_LOOP], 100);
     EXPECT_EQ(out.rpt_end_ms[KOVA_SLOT_END], -1);
-
-    EXPECT_EQ(kova_set_rptinfo(ctx, 2, &in), KOVA_ERR_INVALID_PARAM);
-    EXPECT_EQ(kova_set_rptinfo(ctx, 1, nullptr), KOVA_ERR_INVALID_PARAM);
-    EXPECT_EQ(kova_set_rptinfo(nullptr, 1, &in), KOVA_ERR_INVALID_PARAM);
-    EXPECT_EQ(l->rpt_end, 0);
 }

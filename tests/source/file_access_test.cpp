@@ -36,10 +36,6 @@ TEST(FileAccess, PathLimitPositionsAndSize) {
     EXPECT_EQ(f.m.read(f.h, &b, 1), 1);
     EXPECT_EQ(b, data[650]);
     EXPECT_EQ(f.m.write(f.h, &b, 1), -1);
-    kova_mem_fail_after(0);
-    TARQ_MFAL m;
-    EXPECT_EQ(tarq_mfal_init(path.c_str(), &m), -1);
-    kova_mem_fail_after(-1);
 }
 
 TEST(FileAccess, WriteOpenCreates0644AndKeepsTheOldTail) {
