@@ -15,7 +15,10 @@ int main(int argc, char** argv) {
     kova_bench::register_resample_benchmarks();
     kova_bench::register_ringbuffer_benchmarks();
     kova_bench::register_generate_benchmarks();
+    kova_bench::register_paced_benchmarks();
     kova_bench::report_memory();
+    kova_bench::report_registry_wait();
+    kova_bench::report_latency();
     std::cout << kova_bench::preamble_text() << std::endl;
 
     kova_bench::CollectingReporter reporter;

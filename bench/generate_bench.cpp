@@ -9,6 +9,7 @@
 #include "bench_files.h"
 #include "bench_registry.h"
 #include "bench_signal.h"
+#include "kova/kova_dsp.h"
 #include "kova/kova_engine.h"
 #include "summary.h"
 #include "util/kova_mem.h"
@@ -103,6 +104,41 @@ class Stroke {
     int64_t t_ = 0;
 };
 
+// The floor: the equaliser's recurrence alone over one 16 ms stereo block (1536 samples, one
+// state chain across both channels), inputs already normalised, nothing else. Each sample is
+// two chains of four dependent operations (subtract, multiply, add, add); no implementation of
+// the same output can take less than one such chain per sample.
+constexpr int kFloorSamples = static_cast<int>(kChannels * kRate * kMoveMs / 1000);
+
+[[gnu::noinline]] void floor_recurrence(const double* x, int n, KOVA_EQ& eq) {
+    constexpr double kBias = 2.3283064370807974e-10;
+    double low = eq.low_state;
+    double high = eq.high_state;
+    const double lc = eq.low_coef;
+    const double hc = eq.high_coef;
+    for (int i = 0; i < n; ++i) {
+        low = low + (lc * (x[i] - low) + kBias);
+        high = high + (hc * (x[i] - high) + kBias);
+    }
+    eq.low_state = low;
+    eq.high_state = high;
+}
+
+void bm_floor(benchmark::State& state) {
+    const std::vector<int16_t> pcm = noise_pcm(kFloorSamples, 7);
+    std::vector<double> x(pcm.size());
+    for (size_t i = 0; i < pcm.size(); ++i) x[i] = pcm[i] * 9.0 / 2147483647.0;
+    KOVA_EQ eq;
+    kova_eq_init(&eq, 880, 5000, kRate);
+    for (auto _ : state) {
+        floor_recurrence(x.data(), kFloorSamples, eq);
+        benchmark::DoNotOptimize(eq.low_state);
+        benchmark::DoNotOptimize(eq.high_state);
+    }
+}
+
+constexpr const char* kFloorName = "generate/floor_recurrence";
+
 std::string name_of(const GenCase& c) {
     return std::string("generate/") + c.label;
 }
@@ -175,6 +211,42 @@ void fingerprints() {
     }
 }
 
+// Library time per 16 ms move over the floor's time, both medians of the same run.
+int floor_summary(const Results& r, std::ostream& out) {
+    const Measured* floor = find(r, kFloorName);
+    if (!floor) return 0;
+    struct Row {
+        const char* label;
+        const char* bench;
+        double target;
+    };
+    constexpr Row kRows[] = {{"plain move", "generate/move_plain", 1.5},
+                             {"move with panning", "generate/move_pan", 0},
+                             {"move with oscillator", "generate/move_osc", 0},
+                             {"move with pitch raise", "generate/move_pitch", 0},
+                             {"move with all features", "generate/move_all", 2.5}};
+    int missed = 0;
+    out << "\n### Generation against the floor (16 ms stereo move at 48000 Hz; floor: the "
+           "equaliser's recurrence alone over the same 1536 samples, "
+        << fixed(floor->cpu_ns / 1e3, 2) << " us)\n\n"
+        << "| move | us/event | x floor | target |\n|---|---|---|---|\n";
+    for (const Row& row : kRows) {
+        const Measured* m = find(r, row.bench);
+        if (!m) continue;
+        const double ratio = m->cpu_ns / floor->cpu_ns;
+        out << "| " << row.label << " | " << fixed(m->cpu_ns / 1e3, 2) << " | " << fixed(ratio, 2)
+            << " | ";
+        if (row.target > 0) {
+            missed += ratio > row.target;
+            out << "<= " << fixed(row.target, 1) << " " << verdict(ratio <= row.target);
+        } else {
+            out << "-";
+        }
+        out << " |\n";
+    }
+    return missed;
+}
+
 int summary(const Results& r, std::ostream& out) {
     int missed = 0;
     out << "\n### Generation per event (48000 Hz stereo, 1080x2280, files of 38400/192000/38400 "
@@ -211,7 +283,9 @@ void register_generate_benchmarks() {
     for (const GenCase& c : kCases) {
         benchmark::RegisterBenchmark(name_of(c).c_str(), bm_generate, c);
     }
+    benchmark::RegisterBenchmark(kFloorName, bm_floor);
     add_section(30, summary);
+    add_section(31, floor_summary);
 }
 
 }  // namespace kova_bench

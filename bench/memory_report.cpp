@@ -1,8 +1,6 @@
 // Heap held by one instance, step by step as an application builds it: the Java init (instance
 // record, its 960000-byte PCM buffer, the output stream with its ring buffer, the engine
 // context), then a source set registered from three files, then one registered from a saved file.
-#include <jni.h>
-
 #include <cstdint>
 #include <string>
 #include <vector>
@@ -10,16 +8,11 @@
 #include "alloc_count.h"
 #include "bench_files.h"
 #include "bench_registry.h"
+#include "jni_entries.h"
 #include "kova/kova_engine.h"
 #include "kova/android/kova_registry.h"
 #include "summary.h"
 #include "util/kova_mem.h"
-
-// The Java entry points of init and deinit use neither the JNI environment nor the class.
-extern "C" {
-jlong Java_com_corvane_audio_Kova_init(JNIEnv*, jclass, jint, jint, jint, jint, jint);
-jint Java_com_corvane_audio_Kova_deinit(JNIEnv*, jclass, jlong);
-}
 
 namespace kova_bench {
 namespace {

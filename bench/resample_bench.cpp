@@ -1,6 +1,9 @@
 // Resampling one generation block: the library's stereo resampler against what a caller holding
 // 16-bit PCM would otherwise use: libsamplerate's linear converter (with its 16-bit <-> float
-// conversions) and the speexdsp resampler at quality 0 on interleaved 16-bit samples.
+// conversions, and without them) and the speexdsp resampler at quality 0 on interleaved 16-bit
+// samples and through its float interface. The peers keep their state from block to block;
+// the library's resampler starts each block afresh (its interface has no state), and speexdsp
+// filters with a windowed sinc, a higher quality than linear interpolation.
 #include <samplerate.h>
 #include <speex/speex_resampler.h>
 
@@ -121,9 +124,11 @@ void bm_kova(benchmark::State& state, double ratio) {
     state.counters["out_samples"] = produced;
 }
 
-// libsamplerate as a 16-bit caller uses it: convert in, convert the result back. One converter
-// state for the whole run, fed block after block, which is the converter's cheapest use.
-void bm_src_linear(benchmark::State& state, double ratio) {
+// libsamplerate as a 16-bit caller uses it: convert in, convert the result back; with `helpers`
+// false, the converter alone on float data converted beforehand (the conversions take a large
+// part of the time). One converter state for the whole run, fed block after block, which is the
+// converter's cheapest use.
+void bm_src_linear(benchmark::State& state, double ratio, bool helpers) {
     const Block b = make_block(ratio);
     const long frames = b.in_samples / 2;
     std::vector<float> fin(b.input.size());
@@ -136,8 +141,11 @@ void bm_src_linear(benchmark::State& state, double ratio) {
         return;
     }
     long produced = 0;
+    src_short_to_float_array(b.input.data(), fin.data(), static_cast<int>(b.input.size()));
     for (auto _ : state) {
-        src_short_to_float_array(b.input.data(), fin.data(), static_cast<int>(b.input.size()));
+        if (helpers) {
+            src_short_to_float_array(b.input.data(), fin.data(), static_cast<int>(b.input.size()));
+        }
         SRC_DATA d{};
         d.data_in = fin.data();
         d.data_out = fout.data();
@@ -146,9 +154,12 @@ void bm_src_linear(benchmark::State& state, double ratio) {
         d.src_ratio = static_cast<double>(b.out_rate) / kRate;
         d.end_of_input = 0;
         src_process(src, &d);
-        src_float_to_short_array(fout.data(), out.data(),
-                                 static_cast<int>(d.output_frames_gen * 2));
+        if (helpers) {
+            src_float_to_short_array(fout.data(), out.data(),
+                                     static_cast<int>(d.output_frames_gen * 2));
+        }
         benchmark::DoNotOptimize(out.data());
+        benchmark::DoNotOptimize(fout.data());
         benchmark::ClobberMemory();
         produced = d.output_frames_gen * 2;
     }
@@ -179,6 +190,46 @@ void bm_speex_q0(benchmark::State& state, double ratio) {
     speex_resampler_destroy(st);
     set_counters(state, b);
     state.counters["out_samples"] = produced;
+}
+
+// speexdsp at quality 0 through its float interface, on float data converted beforehand.
+void bm_speex_q0_float(benchmark::State& state, double ratio) {
+    const Block b = make_block(ratio);
+    std::vector<float> fin(b.input.begin(), b.input.end());
+    std::vector<float> fout(b.input.size() * 2 + 256);
+    int err = 0;
+    SpeexResamplerState* st = speex_resampler_init(2, kRate, b.out_rate, 0, &err);
+    if (st == nullptr) {
+        state.SkipWithError(speex_resampler_strerror(err));
+        return;
+    }
+    for (auto _ : state) {
+        spx_uint32_t in_len = static_cast<spx_uint32_t>(b.in_samples / 2);
+        spx_uint32_t out_len = static_cast<spx_uint32_t>(fout.size() / 2);
+        speex_resampler_process_interleaved_float(st, fin.data(), &in_len, fout.data(), &out_len);
+        benchmark::DoNotOptimize(fout.data());
+        benchmark::ClobberMemory();
+    }
+    speex_resampler_destroy(st);
+    set_counters(state, b);
+}
+
+// The peers' float paths, without 16-bit conversions: no targets, for comparison only.
+int float_summary(const Results& r, std::ostream& out) {
+    out << "\n### Resampling, the peers on float data (no 16-bit conversions; CPU time per "
+           "block)\n\n| ratio | library ns (16-bit) | SRC_LINEAR float ns | speexdsp q0 float ns "
+           "| SRC float / library | speex float / library |\n|---|---|---|---|---|---|\n";
+    for (const RatioCase& rc : kRatios) {
+        const Measured* k = find(r, name_of("kova", rc));
+        const Measured* s = find(r, name_of("src_linear_float", rc));
+        const Measured* x = find(r, name_of("speex_q0_float", rc));
+        if (!k) continue;
+        out << "| " << rc.label << " | " << fixed(k->cpu_ns, 0) << " | "
+            << (s ? fixed(s->cpu_ns, 0) : "-") << " | " << (x ? fixed(x->cpu_ns, 0) : "-") << " | "
+            << (s ? fixed(s->cpu_ns / k->cpu_ns, 2) + "x" : "-") << " | "
+            << (x ? fixed(x->cpu_ns / k->cpu_ns, 2) + "x" : "-") << " |\n";
+    }
+    return 0;
 }
 
 int summary(const Results& r, std::ostream& out) {
@@ -217,10 +268,16 @@ void register_resample_benchmarks() {
     check_against_reference();
     for (const RatioCase& rc : kRatios) {
         benchmark::RegisterBenchmark(name_of("kova", rc).c_str(), bm_kova, rc.ratio);
-        benchmark::RegisterBenchmark(name_of("src_linear", rc).c_str(), bm_src_linear, rc.ratio);
+        benchmark::RegisterBenchmark(name_of("src_linear", rc).c_str(), bm_src_linear, rc.ratio,
+                                     true);
+        benchmark::RegisterBenchmark(name_of("src_linear_float", rc).c_str(), bm_src_linear,
+                                     rc.ratio, false);
         benchmark::RegisterBenchmark(name_of("speex_q0", rc).c_str(), bm_speex_q0, rc.ratio);
+        benchmark::RegisterBenchmark(name_of("speex_q0_float", rc).c_str(), bm_speex_q0_float,
+                                     rc.ratio);
     }
     add_section(10, summary);
+    add_section(11, float_summary);
 }
 
 }  // namespace kova_bench

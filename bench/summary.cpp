@@ -25,6 +25,7 @@ Measured measured_of(const benchmark::BenchmarkReporter::Run& run) {
     Measured m;
     // GetAdjustedCPUTime is in the run's time unit; the tables work in nanoseconds.
     m.cpu_ns = run.GetAdjustedCPUTime() / benchmark::GetTimeUnitMultiplier(run.time_unit) * 1e9;
+    m.real_ns = run.GetAdjustedRealTime() / benchmark::GetTimeUnitMultiplier(run.time_unit) * 1e9;
     for (const auto& [name, counter] : run.counters) m.counters[name] = counter.value;
     return m;
 }

@@ -14,7 +14,8 @@ namespace kova_bench {
 
 // One benchmark's result: the median over repetitions when there were several, else the run.
 struct Measured {
-    double cpu_ns = 0;  // CPU time per iteration
+    double cpu_ns = 0;   // CPU time per iteration
+    double real_ns = 0;  // wall (or manual) time per iteration
     std::map<std::string, double> counters;
 };
 

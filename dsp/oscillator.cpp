@@ -31,18 +31,70 @@ int64_t period_for(int32_t sample_rate, double freq) {
     return static_cast<int64_t>(p);
 }
 
-double value_at(const KOVA_OSC* osc) {
-    switch (osc->waveform) {
+double wave_value(uint32_t waveform, int64_t phase, int64_t period) {
+    switch (waveform) {
         case kSquare:
-            return osc->phase < osc->period / 2 ? 1.0 : -1.0;
+            return phase < period / 2 ? 1.0 : -1.0;
         case kSawtooth: {
-            double x = static_cast<double>(osc->phase) / static_cast<double>(osc->period);
+            double x = static_cast<double>(phase) / static_cast<double>(period);
             return 2.0 * (x - std::floor(x + 0.5));
         }
         default:
-            return std::sin(kTwoPi * static_cast<double>(osc->phase) /
-                            static_cast<double>(osc->period));
+            return std::sin(kTwoPi * static_cast<double>(phase) / static_cast<double>(period));
     }
+}
+
+double value_at(const KOVA_OSC* osc) {
+    return wave_value(osc->waveform, osc->phase, osc->period);
+}
+
+/* A value depends only on waveform, phase and period, so whole cycles are kept across calls:
+ * the generator sets a new frequency on every move, and a stroke comes back to the same few
+ * periods again and again. Each table holds one cycle of a period up to kTableLen samples;
+ * longer cycles are computed as they come. The tables live in the same heap block, behind the
+ * record, so the record's layout stays as it is. */
+constexpr int64_t kTableLen = 512;
+constexpr int kTables = 8;
+
+struct CycleTable {
+    int64_t period;    /* 0: empty */
+    uint32_t waveform; /* kSquare, kSawtooth or 0 for the sine */
+    uint32_t used;     /* clock value of the last use, to replace the least recently used */
+    double value[kTableLen];
+};
+
+struct OscBlock {
+    KOVA_OSC osc; /* first member: the record's address is the block's */
+    uint32_t clock;
+    CycleTable table[kTables];
+};
+
+uint32_t waveform_kind(uint32_t waveform) {
+    return (waveform == kSquare || waveform == kSawtooth) ? waveform : 0;
+}
+
+/* The cycle of the oscillator's current period, filled on first use; null when the period is
+ * outside the tables' range or the record was not made by kova_osc_init (a copy's `self` no
+ * longer matches its address, and it has no tables behind it). */
+const double* cycle_table(KOVA_OSC* osc) {
+    const int64_t period = osc->period;
+    if (osc->self != osc || period < 1 || period > kTableLen) return nullptr;
+    auto* block = reinterpret_cast<OscBlock*>(osc);
+    const uint32_t kind = waveform_kind(osc->waveform);
+    const uint32_t now = ++block->clock;
+    CycleTable* oldest = &block->table[0];
+    for (CycleTable& t : block->table) {
+        if (t.period == period && t.waveform == kind) {
+            t.used = now;
+            return t.value;
+        }
+        if (t.used < oldest->used) oldest = &t;
+    }
+    oldest->period = period;
+    oldest->waveform = kind;
+    oldest->used = now;
+    for (int64_t ph = 0; ph < period; ++ph) oldest->value[ph] = wave_value(kind, ph, period);
+    return oldest->value;
 }
 
 /* Two channels hand out each value twice so both samples of a frame match. */
@@ -65,12 +117,13 @@ void advance(KOVA_OSC* osc) {
 extern "C" {
 
 KOVA_OSC* kova_osc_init(int32_t sample_rate, uint32_t channels, uint32_t waveform) {
-    auto* osc = static_cast<KOVA_OSC*>(kova_mem_calloc(1, sizeof(KOVA_OSC)));
-    if (osc == nullptr) {
+    auto* block = static_cast<OscBlock*>(kova_mem_calloc(1, sizeof(OscBlock)));
+    if (block == nullptr) {
         puts("KOVA_CTX malloc fail ");
         puts("kova_osc_init() fail. err code (KOVA_ERR_INSUFF_MEM) ");
         return nullptr;
     }
+    KOVA_OSC* osc = &block->osc;
     osc->tag = KOVA_OSC_TAG;
     osc->self = osc;
     osc->sample_rate = sample_rate;
@@ -106,30 +159,50 @@ double kova_osc_get_sample(KOVA_OSC* osc) {
     return v;
 }
 
+/* Exactly the values and state that `count` calls of kova_osc_get_sample would give. */
 void _osc_fill(KOVA_OSC* osc, double* out, int64_t count) {
     if (!valid(osc)) {
         for (int64_t i = 0; i < count; ++i) out[i] = static_cast<double>(KOVA_ERR_INVALID_PARAM);
         return;
     }
-    /* The period is fixed for the whole call, so a value depends on the phase alone: each phase
-     * below kKnown is computed once and reused (both samples of a stereo frame, and every cycle
-     * after the first); phases above it are computed as they come. */
-    constexpr int64_t kKnown = 512;
-    double value[kKnown];
-    bool known[kKnown] = {};
-    for (int64_t i = 0; i < count; ++i) {
-        const int64_t phase = osc->phase;
-        if (phase < kKnown) {
-            if (!known[phase]) {
-                value[phase] = value_at(osc);
-                known[phase] = true;
-            }
-            out[i] = value[phase];
-        } else {
-            out[i] = value_at(osc);
-        }
+    int64_t i = 0;
+    /* A phase left beyond the period by a frequency change comes back through the remainder. */
+    while (i < count && (osc->phase < 0 || osc->phase >= osc->period)) {
+        out[i++] = value_at(osc);
         advance(osc);
     }
+    const double* cycle = cycle_table(osc);
+    if (cycle == nullptr) {
+        for (; i < count; ++i) {
+            out[i] = value_at(osc);
+            advance(osc);
+        }
+        return;
+    }
+    const int64_t period = osc->period;
+    int64_t phase = osc->phase;
+    if (osc->channels == 2) {
+        /* Each value twice; `hold` says the first copy of the current one is already out. */
+        if (i < count && osc->hold == 1) {
+            out[i++] = cycle[phase];
+            phase = (phase + 1 == period) ? 0 : phase + 1;
+            osc->hold = 0;
+        }
+        for (; i + 1 < count; i += 2) {
+            out[i] = out[i + 1] = cycle[phase];
+            phase = (phase + 1 == period) ? 0 : phase + 1;
+        }
+        if (i < count) {
+            out[i] = cycle[phase];
+            osc->hold = 1;
+        }
+    } else {
+        for (; i < count; ++i) {
+            out[i] = cycle[phase];
+            phase = (phase + 1 == period) ? 0 : phase + 1;
+        }
+    }
+    osc->phase = phase;
 }
 
 int32_t kova_osc_gen_samples(KOVA_OSC* osc, int16_t* buf, int32_t bytes) {

@@ -68,14 +68,7 @@ int32_t gen_once(KOVA_CTX* ctx, bool is_end, KOVA_PCMBUF* out, const GenBlock& b
         n = (avail < out->size / 2) ? avail : out->size / 2;
         const double slot_gain = is_end ? b.tune->end_gain : b.tune->start_gain;
         const double g = b.tune->gain * slot_gain * ctx->volume * b.level;
-        const int16_t* pcm = src->pcm_proc;
-        int16_t* data = out->data;
-        kova_gen::EqKernel eq(ctx->eq);
-        for (int32_t i = 0; i < n; ++i) {
-            const int16_t s = kova_gen::finish_sample(eq, g * pcm[i]);
-            // Panning applies after finishing here; with unit gains this is the sample itself.
-            data[i] = static_cast<int16_t>(kova::dsp::trunc_sat32(s * b.pan_gain[i & 1]));
-        }
+        kova_gen::render_once(ctx->eq, src->pcm_proc, n, g, b.pan_gain, out->data);
     }
     if (is_end) b.loop->pos = 0;
     return n;

@@ -33,9 +33,14 @@ struct GenBlock {
     double pan_gain[2]; /* even (left) and odd (right) samples; 1.0 each when panning is off */
 };
 
-/* trunc_sat32 with the common in-range case tested first (one comparison instead of three). */
+/* trunc_sat32 with the common in-range case tested first, on the exponent bits: |v| < 2^31
+ * (where the conversion is defined and equals the saturated one) exactly when the biased
+ * exponent is below 1023 + 31; NaN and infinities have the largest exponent. An integer test
+ * leaves the floating-point ports, which the equaliser's chain needs, to the chain. */
 inline int32_t trunc32(double v) {
-    if (__builtin_fabs(v) < 2147483647.0) [[likely]]
+    uint64_t bits;
+    __builtin_memcpy(&bits, &v, sizeof bits);
+    if (((bits >> 52) & 0x7FF) < 1023 + 31) [[likely]]
         return static_cast<int32_t>(v);
     return kova::dsp::trunc_sat32(v);
 }
@@ -63,17 +68,22 @@ class EqKernel {
     EqKernel& operator=(const EqKernel&) = delete;
     ~EqKernel() { store(); }
 
-    int32_t proc(int32_t sample) {
-        constexpr double kFullScale = 2147483647.0;
+    int32_t proc(int32_t sample) { return proc_input(static_cast<double>(sample) / kFullScale); }
+
+    /* The same step from an input already normalised (sample / 2147483647.0). With kUnitMid
+     * the mid band's gain, always 1.0 in the library's equaliser, is left out: multiplying by
+     * 1.0 changes no bit, and one multiply less per sample shows in the generator's loop. */
+    template <bool kUnitMid = false>
+    int32_t proc_input(double x) {
         constexpr double kStateBias = 2.3283064370807974e-10;
-        const double x = static_cast<double>(sample) / kFullScale;
         low_state_ = low_state_ + (low_coef_ * (x - low_state_) + kStateBias);
         high_state_ = high_state_ + (high_coef_ * (x - high_state_) + kStateBias);
         const double delayed = h2_;
         const double low = low_state_;
         const double high = delayed - high_state_;
         const double mid = delayed - (low + high);
-        const double y = (high * high_gain_ + (low * low_gain_ + mid * mid_gain_)) * kFullScale;
+        const double mid_part = kUnitMid ? mid : mid * mid_gain_;
+        const double y = (high * high_gain_ + (low * low_gain_ + mid_part)) * kFullScale;
         h2_ = h1_;
         h1_ = h0_;
         h0_ = x;
@@ -90,15 +100,18 @@ class EqKernel {
     }
 
    private:
+    static constexpr double kFullScale = 2147483647.0;
     KOVA_EQ* eq_;
     double low_coef_, low_state_, high_coef_, high_state_;
     double h0_, h1_, h2_;
     double low_gain_, mid_gain_, high_gain_;
 };
 
-/* Equaliser, then clipping with rotating replacement values, then 16 bits. */
-inline int16_t finish_sample(EqKernel& eq, double v) {
-    int32_t r = eq.proc(trunc32(v));
+/* Equaliser (from a normalised input), then clipping with rotating replacement values, then
+ * 16 bits. */
+template <bool kUnitMid = false>
+inline int16_t finish_input(EqKernel& eq, double x) {
+    int32_t r = eq.proc_input<kUnitMid>(x);
     if (r >= kClipHigh) [[unlikely]] {
         if (clip_count_hi >= kClipWrap) clip_count_hi = 0;
         clip_count_hi = static_cast<int16_t>(clip_count_hi + kClipStep);
@@ -116,6 +129,33 @@ inline int32_t playable_samples(const KOVA_SRC* src) {
     if (src == nullptr || src->pcm_proc == nullptr || src->size < 2) return 0;
     return src->size / 2;
 }
+
+/* The loop part of a move as the sample kernel takes it. `c` is the envelope factor before the
+ * first sample; it climbs by `step` before every even sample. */
+struct LoopRender {
+    const int16_t* pcm;
+    int32_t pos; /* play position, updated */
+    int32_t loop_end;
+    int32_t restart;
+    double gain;
+    double c;
+    double step;
+    double pan_gain[2];
+    KOVA_OSC* osc; /* null when the oscillator is off */
+    bool slew;
+    double decay;     /* slew memory factor */
+    int16_t mem_even; /* slew memories, updated */
+    int16_t mem_odd;
+};
+
+/* `count` loop samples into dst: envelope, gain, oscillator, panning, equaliser, clipping and,
+ * when r.slew, the slew limiter. */
+void render_loop(KOVA_EQ* eq, LoopRender& r, int16_t* dst, int64_t count);
+
+/* A start or end sound: `count` samples of pcm times gain through the equaliser and the
+ * clipper, each finished sample then multiplied by the pan gain of its parity. */
+void render_once(KOVA_EQ* eq, const int16_t* pcm, int64_t count, double gain,
+                 const double pan_gain[2], int16_t* dst);
 
 /* Move event (action 1): the speed-shaped loop block. Returns samples written. */
 int32_t gen_move(KOVA_CTX* ctx, const KOVA_PARAM* cur, KOVA_PCMBUF* out, const GenBlock& b);

@@ -22,7 +22,6 @@ constexpr int32_t kLoopEndMargin = 4;  // samples
 constexpr double kMsPerSecond = 1000.0;
 constexpr double kOscFreqFactor = 200.0;
 constexpr double kSharpFactor = 0.1;
-constexpr int32_t kSlewLimit = 1000;
 constexpr int64_t kWorkSamples = KOVA_WORK_BUF_BYTES / 2;
 // The resampler's 4.28 step must stay below 7.0; with the output rate rounded down to an even
 // number the effective ratio exceeds this cap by at most 0.01 at 8000 Hz.
@@ -75,118 +74,10 @@ float depth_as_float(double d) {
     return static_cast<float>(d);
 }
 
-// Per-call values of the sample loop.
-struct LoopRun {
-    const int16_t* pcm;
-    int32_t pos;
-    LoopBounds bounds;
-    double gain;
-    double step;
-    double pan_gain[2];
-};
-
 // Slew memory factor. The equaliser only ever sets 0.7..1.0; a foreign value outside -1..1 (or
 // NaN) could push the memory out of 16 bits, so it is held at 1.0, which keeps the sample.
 double usable_decay(double decay) {
     return (decay >= -1.0 && decay <= 1.0) ? decay : 1.0;
-}
-
-// One output sample from the loop: envelope factor c, oscillator value o, pan gain of its
-// parity; with kSlew the slew limiter against that parity's memory.
-template <bool kSlew>
-struct SampleStep {
-    const int16_t* pcm;
-    double gain;
-    double decay;
-    int32_t loop_end;
-    int32_t restart;
-
-    [[gnu::always_inline]] inline int16_t operator()(kova_gen::EqKernel& eq, int32_t& pos, double c,
-                                                     double o, double pan, int16_t& memory) const {
-        const int16_t s = pcm[pos];
-        pos = pos + 1;
-        int16_t d = kova_gen::finish_sample(eq, gain * s * c * o * pan);
-        if (pos >= loop_end) pos = restart;
-        if (kSlew) {
-            // |m - d| >= limit moves d to m -/+ limit: the same as clamping d into
-            // [m - limit, m + limit]. Written as a clamp it compiles to conditional moves; the
-            // branch it replaces went either way at random on noise-like sources.
-            const int32_t m = memory;
-            const int32_t lo = m - kSlewLimit;
-            const int32_t hi = m + kSlewLimit;
-            int32_t v = d;
-            v = v < lo ? lo : v;
-            v = v > hi ? hi : v;
-            d = static_cast<int16_t>(v);
-            // |d * decay| <= 32768: the conversion is always defined.
-            memory = static_cast<int16_t>(static_cast<int32_t>(d * decay));
-        }
-        return d;
-    }
-};
-
-// Oscillator values are fetched a chunk at a time into this many slots on the stack, so the
-// sample loop itself makes no calls and keeps the equaliser state in registers. Even, so the
-// parities of every chunk line up with the whole block.
-constexpr int64_t kOscChunk = 256;
-
-// Per-block loop state that moves from one span to the next.
-struct SpanState {
-    double c;  // envelope factor
-    int32_t pos;
-    int16_t mem_even;
-    int16_t mem_odd;
-};
-
-// Renders `count` samples into dst, the envelope factor climbing by one step per pair (before
-// the even sample), the oscillator value o[i] per sample when kOsc. Written per pair so each
-// parity's pan gain and slew memory stay in registers.
-template <bool kOsc, bool kSlew>
-void render_span(kova_gen::EqKernel& eq, const SampleStep<kSlew>& one, const LoopRun& run,
-                 SpanState& st, const double* o, int16_t* dst, int64_t count) {
-    const double step = run.step;
-    const double pan_even = run.pan_gain[0];
-    const double pan_odd = run.pan_gain[1];
-    double c = st.c;
-    int32_t pos = st.pos;
-    int16_t mem_even = st.mem_even;
-    int16_t mem_odd = st.mem_odd;
-    int64_t i = 0;
-    for (; i + 1 < count; i += 2) {
-        c = c + step;
-        dst[i] = one(eq, pos, c, kOsc ? o[i] : 1.0, pan_even, mem_even);
-        dst[i + 1] = one(eq, pos, c, kOsc ? o[i + 1] : 1.0, pan_odd, mem_odd);
-    }
-    if (i < count) {
-        c = c + step;
-        dst[i] = one(eq, pos, c, kOsc ? o[i] : 1.0, pan_even, mem_even);
-    }
-    st = SpanState{c, pos, mem_even, mem_odd};
-}
-
-// Renders a whole block from the loop source (the envelope starting at c), updating the play
-// position in run and, with kSlew, the context's slew memories.
-template <bool kSlew>
-void render_block(KOVA_CTX* ctx, bool osc_on, LoopRun& run, double c, int16_t* dst, int64_t count) {
-    kova_gen::EqKernel eq(ctx->eq);
-    const SampleStep<kSlew> one{run.pcm, run.gain, usable_decay(ctx->eq->slew_decay),
-                                run.bounds.end, run.bounds.restart};
-    SpanState st{c, run.pos, ctx->slew_even, ctx->slew_odd};
-    if (!osc_on) {
-        render_span<false>(eq, one, run, st, nullptr, dst, count);
-    } else {
-        double o[kOscChunk];
-        for (int64_t done = 0; done < count; done += kOscChunk) {
-            const int64_t len = (count - done < kOscChunk) ? count - done : kOscChunk;
-            _osc_fill(ctx->osc, o, len);
-            render_span<true>(eq, one, run, st, o, dst + done, len);
-        }
-    }
-    run.pos = st.pos;
-    if (kSlew) {
-        ctx->slew_even = st.mem_even;
-        ctx->slew_odd = st.mem_odd;
-    }
 }
 
 }  // namespace
@@ -242,26 +133,34 @@ int32_t gen_move(KOVA_CTX* ctx, const KOVA_PARAM* cur, KOVA_PCMBUF* out, const G
     if (n < 1) return 0;
     const double step = ((env - e0) / n) / channels;
 
-    LoopRun run{};
+    kova_gen::LoopRender run{};
     run.pcm = loop->pcm_proc;
     run.pos = loop->pos;
-    run.bounds = bounds;
+    run.loop_end = bounds.end;
+    run.restart = bounds.restart;
     run.gain = tune->gain * tune->loop_gain * ctx->volume * b.level;
+    run.c = e0;
     run.step = step;
     run.pan_gain[0] = b.pan_gain[0];
     run.pan_gain[1] = b.pan_gain[1];
-    const bool osc_on = tune->osc_enable == 1;
+    run.osc = tune->osc_enable == 1 ? ctx->osc : nullptr;
+    run.decay = usable_decay(ctx->eq->slew_decay);
+    run.mem_even = ctx->slew_even;
+    run.mem_odd = ctx->slew_odd;
 
     if (tune->sharp_enable != 1) {
-        render_block<true>(ctx, osc_on, run, e0, out->data, n);
+        run.slew = true;
+        kova_gen::render_loop(ctx->eq, run, out->data, n);
         loop->pos = run.pos;
+        ctx->slew_even = run.mem_even;
+        ctx->slew_odd = run.mem_odd;
         return n;
     }
 
     double ratio = _calc_sharpness(env, depth_as_float(tune->sharpness));
     if (ratio > kMaxRatio) ratio = kMaxRatio;
     if (ratio == 1.0) {
-        render_block<false>(ctx, osc_on, run, e0, out->data, n);
+        kova_gen::render_loop(ctx->eq, run, out->data, n);
         loop->pos = run.pos;
         return n;
     }
@@ -270,7 +169,7 @@ int32_t gen_move(KOVA_CTX* ctx, const KOVA_PARAM* cur, KOVA_PCMBUF* out, const G
     // would ask for up to 7x the block).
     int64_t m = static_cast<int64_t>(ratio * n);
     if (m > kWorkSamples) m = kWorkSamples;
-    render_block<false>(ctx, osc_on, run, e0, ctx->work_buf, m);
+    kova_gen::render_loop(ctx->eq, run, ctx->work_buf, m);
     loop->pos = run.pos;
 
     const auto out_rate = 2 * static_cast<int32_t>((rate / ratio) * 0.5);

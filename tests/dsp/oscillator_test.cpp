@@ -171,4 +171,29 @@ TEST(OscFill, MatchesSingleValuesAndState) {
     }
 }
 
+// Whole cycles are kept across calls, keyed by period and waveform: coming back to a period
+// after others, or changing the waveform field at the same period, must not hand out a cycle
+// kept for something else. More periods than the oscillator keeps, revisited in turn.
+TEST(OscFill, KeptCyclesFollowPeriodAndWaveform) {
+    OscPair p(2, 0);
+    const double freqs[] = {1400.0, 1700.0, 2100.0, 2600.0, 3100.0, 3700.0,
+                            4300.0, 5000.0, 5900.0, 6700.0, 1400.0, 1700.0};
+    int64_t checked = 0;
+    for (int round = 0; round < 3; ++round) {
+        for (double f : freqs) {
+            for (KOVA_OSC* o : {p.one, p.fill}) {
+                kova_osc_set_freq(o, f);
+                o->waveform = static_cast<uint32_t>(round);
+            }
+            std::vector<double> got(301);
+            _osc_fill(p.fill, got.data(), 301);
+            for (double v : got) {
+                ASSERT_TRUE(same_bits(v, kova_osc_get_sample(p.one))) << round << " " << f;
+                ++checked;
+            }
+        }
+    }
+    EXPECT_EQ(checked, 3 * 12 * 301);
+}
+
 }  // namespace

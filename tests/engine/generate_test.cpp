@@ -213,8 +213,23 @@ TEST_F(GenTest, StartAndEndSlots) {
     EXPECT_EQ(ctx->prev_env, env);
 }
 
-// Start sound of a constant 10000 with panning depth 0.4: gain 1 * 0.6 * 0.8 * 0.4.
+// Start sound with panning depth 0.4: gain 1 * 0.6 * 0.8 * 0.4. First an odd-length varied
+// sound, bit for bit against the documented order (equaliser, then the pan gain on the finished
+// sample) across several of the generator's chunks; then a constant 10000 at both screen edges.
 TEST_F(GenTest, PanGainsFollowPosition) {
+    const std::vector<int16_t> start = kova_test::varied(1001);
+    set->src[KOVA_SLOT_START] = kova_test::make_src(KOVA_SLOT_START, KOVA_ORIGIN_FILE, start);
+    ASSERT_EQ(gen(ctx.get(), event(300, 5, 900, KOVA_ACTION_START), buf), 2002);
+    KOVA_EQ eq;
+    kova_eq_init(&eq, 880, 5000, 48000);
+    const double q = 0.4 * (300.0f / 1080.0f);
+    const double pan[2] = {1.0 - q, 1.0 - 0.4 + q};
+    for (size_t i = 0; i < start.size(); ++i) {
+        const auto s = static_cast<int16_t>(
+            kova_eq_proc(&eq, static_cast<int32_t>(1.0 * 0.6 * 0.8 * 0.4 * start[i])));
+        ASSERT_EQ(buf[i], static_cast<int16_t>(static_cast<int32_t>(s * pan[i % 2]))) << i;
+    }
+    kova_free_sourceobj(set->src[KOVA_SLOT_START]);
     set->src[KOVA_SLOT_START] =
         kova_test::make_src(KOVA_SLOT_START, KOVA_ORIGIN_FILE, std::vector<int16_t>(400, 10000));
     const float xs[2] = {0.0f, 1080.0f};
