@@ -5,7 +5,7 @@
 #include <cstring>
 #include <memory>
 
-#include "engine/engine_internal.h"
+#include "engine/srcset_build.h"
 #include "kova/kova_dsp.h"
 #include "kova/kova_engine.h"
 #include "kova/kova_source.h"

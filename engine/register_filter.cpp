@@ -1,5 +1,5 @@
 // Registration of a source set whose loop sound is white noise shaped by one filter.
-#include "engine/engine_internal.h"
+#include "engine/srcset_build.h"
 #include "kova/kova_dsp.h"
 #include "kova/kova_engine.h"
 #include "kova/kova_source.h"

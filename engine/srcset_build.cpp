@@ -1,5 +1,5 @@
 // Building a new source set and adding it to a context's list, for every way of registering.
-#include "engine/engine_internal.h"
+#include "engine/srcset_build.h"
 #include "util/kova_mem.h"
 
 namespace {

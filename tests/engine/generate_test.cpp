@@ -11,7 +11,7 @@
 
 #include "engine_fixture.h"
 #include "kova/kova_dsp.h"
-#include "engine/generate_finish.h"
+#include "engine/sample_kernel.h"
 
 namespace {
 
