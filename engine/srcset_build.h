@@ -58,10 +58,6 @@ int32_t _srcset_register(KOVA_CTX* ctx, int32_t limit, int32_t* err, Fill fill) 
     return id;
 }
 
-/* Whether a filter descriptor can be designed and run without degenerate coefficients
- * (filter_update.cpp). */
-bool _flt_dsc_usable(const KOVA_FLT_DSC* dsc);
-
 /* Appends a copy of `dsc` to a filter list; false (list unchanged) when memory ran out. */
 bool _flt_list_push_copy(LIST* filters, const KOVA_FLT_DSC* dsc);
 

@@ -12,6 +12,7 @@
 #include <cstring>
 
 #include "kova/kova_source.h"
+#include "source/filter_dsc.h"
 #include "source/source_io.h"
 #include "util/byte_time.h"
 #include "util/kova_mem.h"
@@ -127,7 +128,7 @@ KOVA_API int kova_get_filters_fromfile(const char* path, KOVA_FLT_DSC flt[KOVA_F
         // Only the descriptors the set reader would keep name an element; a later one of the
         // same type replaces an earlier one.
         if (_read_KOVA_FLT_DSC(q.file.handle(), q.file.mfal(), dsc) != kFltDscBytes) continue;
-        if (!stored_filter_usable(*dsc)) continue;
+        if (!filter_dsc_ok(dsc, FilterUse::kStored)) continue;
         std::memcpy(&flt[dsc->type], dsc, sizeof(KOVA_FLT_DSC));
     }
     kova_mem_free(dsc);

@@ -30,14 +30,6 @@ constexpr int32_t kLargestSlotBytes = KOVA_SLOT_LOOP_MAX_BYTES;
 // over billions of records.
 constexpr int32_t kMaxStoredFilters = 64;
 
-// A stored descriptor is taken only with a filter type code and a channel count of 1 or 2, the
-// only counts an engine runs with: a filter keeps state per channel, so a hostile count would
-// make it allocate gigabytes. Other fields are used as stored; the filter design copes with
-// degenerate frequencies.
-inline bool stored_filter_usable(const KOVA_FLT_DSC& dsc) {
-    return dsc.type < KOVA_FLT_TYPE_COUNT && dsc.channels >= 1 && dsc.channels <= 2;
-}
-
 // Sizes of the records in a source-set file.
 constexpr int kCountBytes = 4;
 constexpr int kFltDscBytes = 40;

@@ -29,6 +29,7 @@
 #include "kova/kova_dsp.h"
 #include "kova/kova_list.h"
 #include "kova/kova_source.h"
+#include "source/filter_dsc.h"
 #include "source/source_io.h"
 #include "util/kova_mem.h"
 
@@ -157,7 +158,7 @@ KOVA_API int kova_open_source(KOVA_SRCSET* set, const char* path) {
         if (dsc == nullptr) return KOVA_ERR_INSUFF_MEM;
         // Only whole, usable descriptors are kept: a record cut by the end of the file would
         // carry zeros for its missing fields.
-        if (_read_KOVA_FLT_DSC(h, m, dsc) != kFltDscBytes || !stored_filter_usable(*dsc)) {
+        if (_read_KOVA_FLT_DSC(h, m, dsc) != kFltDscBytes || !filter_dsc_ok(dsc, FilterUse::kStored)) {
             kova_mem_free(dsc);
             continue;
         }
