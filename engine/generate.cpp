@@ -36,8 +36,7 @@ KOVA_SRCSET* playable_set(const KOVA_CTX* ctx) {
 
 // The set a request plays from: a usable event, an output buffer with room and a context that can
 // generate. Null refuses the request. Each entry point checks its request here once.
-KOVA_SRCSET* checked_request(const KOVA_CTX* ctx, const KOVA_PARAM* param,
-                             const KOVA_PCMBUF* out) {
+KOVA_SRCSET* checked_request(const KOVA_CTX* ctx, const KOVA_PARAM* param, const KOVA_PCMBUF* out) {
     if (!event_ok(param) || out == nullptr || out->data == nullptr || out->size < 1) {
         return nullptr;
     }
