@@ -40,7 +40,9 @@ int32_t edit_filters(KOVA_CTX* ctx, int32_t index, const KOVA_FLT_DSC* dsc, int3
                      bool attach) {
     if (err == nullptr) return 0;
     *err = KOVA_ERR_INVALID_PARAM;
-    if (!_ctx_alive(ctx) || !_srcset_index_ok(ctx, index) || !kova_source::filter_dsc_ok(dsc, kova_source::FilterUse::kDesign)) return 0;
+    if (!_ctx_alive(ctx) || !_srcset_index_ok(ctx, index) ||
+        !kova_source::filter_dsc_ok(dsc, kova_source::FilterUse::kDesign))
+        return 0;
 
     KovaCtxLock lock(ctx);
     KOVA_SRCSET* set = _fetch_srcset(ctx, index);

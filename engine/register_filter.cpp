@@ -11,7 +11,8 @@ extern "C" KOVA_API int32_t kova_reg_src_byfilter(KOVA_CTX* ctx, const KOVA_FLT_
     *err = KOVA_ERR_INVALID_PARAM;
     // Degenerate descriptors (no rate, frequencies at or past Nyquist, NaN, ...) would design
     // infinite or unstable coefficients; they are refused here, before anything is built.
-    if (!_ctx_alive(ctx) || !kova_source::filter_dsc_ok(dsc, kova_source::FilterUse::kDesign)) return 0;
+    if (!_ctx_alive(ctx) || !kova_source::filter_dsc_ok(dsc, kova_source::FilterUse::kDesign))
+        return 0;
 
     return _srcset_register(ctx, KOVA_MAX_SRCSETS, err, [&](KOVA_SRCSET* set) {
         _fill_reg_tune(set->tune, 0.5, 0.0);

@@ -158,7 +158,8 @@ KOVA_API int kova_open_source(KOVA_SRCSET* set, const char* path) {
         if (dsc == nullptr) return KOVA_ERR_INSUFF_MEM;
         // Only whole, usable descriptors are kept: a record cut by the end of the file would
         // carry zeros for its missing fields.
-        if (_read_KOVA_FLT_DSC(h, m, dsc) != kFltDscBytes || !filter_dsc_ok(dsc, FilterUse::kStored)) {
+        if (_read_KOVA_FLT_DSC(h, m, dsc) != kFltDscBytes ||
+            !filter_dsc_ok(dsc, FilterUse::kStored)) {
             kova_mem_free(dsc);
             continue;
         }

@@ -27,7 +27,6 @@ TEST(TuneTest, SetTakesOnlyValuesInRange) {
     EXPECT_EQ(kova_set_tuneset(ctx.get(), 1, &in), KOVA_OK);
     EXPECT_EQ(tune_values(t),
               (std::vector<double>{0.5, 0.5, 0, 1.0, 0, 0.7, 0.5, 0.5, 0.5, 0.5, 0.5}));
-
 }
 
 TEST(TuneTest, ThicknessAndVolume) {

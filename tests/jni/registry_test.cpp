@@ -294,8 +294,9 @@ TEST_F(Lifecycle, FailedInitReleasesEverythingAndLeavesNoSlot) {
         const jlong id = init_default();
         kova_mem_fail_after(-1);
         EXPECT_EQ(id, n == 0 ? 0 : -1);
-        EXPECT_EQ(jni_lines(cap), n == 0 ? Lines{"kova_init()"}
-                                         : (Lines{"kova_init()", "kova_init() is failed. error=-2"}));
+        EXPECT_EQ(jni_lines(cap), n == 0
+                                      ? Lines{"kova_init()"}
+                                      : (Lines{"kova_init()", "kova_init() is failed. error=-2"}));
         for (const KovaInfo& slot : pKOVAInfo) ASSERT_EQ(slot.isUsed, 0) << n;
     }
     ASSERT_EQ(init_default(), 1);
@@ -361,6 +362,5 @@ TEST_F(Lifecycle, UnloadTearsDownEveryInstanceAndKeepsTheLock) {
     EXPECT_EQ(pthread_mutex_trylock(lock), 0);
     pthread_mutex_unlock(lock);
 }
-
 
 }  // namespace

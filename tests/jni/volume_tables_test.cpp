@@ -26,8 +26,8 @@ uint64_t fnv1a(uint64_t h, const float* v, size_t n) {
 
 TEST(VolumeTables, ChecksumOfEveryTable) {
     uint64_t h = 0xcbf29ce484222325ull;
-    for (const float* t : {spkVolume, headsetVolume, earpieceVolume, bluetoothVolume, usbVolume,
-                           hdmiVolume}) {
+    for (const float* t :
+         {spkVolume, headsetVolume, earpieceVolume, bluetoothVolume, usbVolume, hdmiVolume}) {
         h = fnv1a(h, t, KOVA_VOLUME_DEVICE_VALUES);
     }
     h = fnv1a(h, situationVolume, KOVA_VOLUME_SITUATION_VALUES);
