@@ -170,7 +170,7 @@ def main():
                 failed_log = os.path.join(build, "Testing", "Temporary", "LastTestsFailed.log")
                 if os.path.exists(failed_log):
                     os.remove(failed_log)
-                rc = run(["ctest", "-j", args.jobs, "--timeout", "120"], build, log)
+                rc = run(["ctest", "-j", args.jobs, "--timeout", "60"], build, log)  # a hang (missed unlock) times out
                 if os.path.exists(failed_log):
                     caught = [l.split(":", 1)[1].strip() for l in open(failed_log) if ":" in l]
                 if rc and caught:
