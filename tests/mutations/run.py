@@ -170,7 +170,8 @@ def main():
                 failed_log = os.path.join(build, "Testing", "Temporary", "LastTestsFailed.log")
                 if os.path.exists(failed_log):
                     os.remove(failed_log)
-                rc = run(["ctest", "-j", args.jobs, "--timeout", "60"], build, log)  # a hang (missed unlock) times out
+                # A minute is ample for any suite; a hang (a missed unlock) times out.
+                rc = run(["ctest", "-j", args.jobs, "--timeout", "60"], build, log)
                 if os.path.exists(failed_log):
                     caught = [l.split(":", 1)[1].strip() for l in open(failed_log) if ":" in l]
                 if rc and caught:
