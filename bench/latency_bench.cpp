@@ -19,7 +19,7 @@
 #include "bench_registry.h"
 #include "jni_entries.h"
 #include "kova/kova_engine.h"
-#include "kova/kova_registry.h"
+#include "kova/android/kova_registry.h"
 #include "kova_host/audio_sink.h"
 #include "summary.h"
 

@@ -10,7 +10,7 @@
 #include <vector>
 
 #include "bench_registry.h"
-#include "kova/kova_fasttrack.h"
+#include "kova/android/kova_fasttrack.h"
 #include "kova/kova_output.h"
 #include "kova_host/audio_sink.h"
 #include "media/AudioTrack.h"

@@ -13,11 +13,14 @@ namespace {
 
 using kova_gen::GenBlock;
 
-// Coordinates must be finite as well as non-negative: NaN or infinity would turn into
-// meaningless deltas and gains, so such an event is refused like a negative one.
+// Only x < 0, y < 0 and time < 0 refuse an event. A NaN coordinate compares false, so it is
+// accepted (an up event with x = NaN ends the stroke like any other). Non-finite values then
+// meet only conversions with a defined result (trunc_sat32): a NaN axis delta counts as 0 px,
+// an infinite one as 2^31 - 1 px (full speed); a NaN or infinite pan gain makes the sample
+// value NaN (finished as 0) or infinite (finished at the clip limits).
 bool event_ok(const KOVA_PARAM* p) {
-    return p != nullptr && std::isfinite(p->x) && p->x >= 0.0f && std::isfinite(p->y) &&
-           p->y >= 0.0f && p->time >= 0 && p->action <= KOVA_ACTION_END;
+    return p != nullptr && !(p->x < 0.0f) && !(p->y < 0.0f) && p->time >= 0 &&
+           p->action <= KOVA_ACTION_END;
 }
 
 // The active set when the context can generate from it, else null. Every action needs the loop

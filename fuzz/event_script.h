@@ -5,7 +5,7 @@
 //
 // Layout (all values in machine byte order):
 //   header   u8 format flags, u16 w, u16 h, [raw: u32 rate, u32 channels, u32 p]
-//   source   u8 kind (0 files, 1 filter, 2 both), then per kind:
+//   source   u8 kind (0 files, 1 filter, 2 both, above 2 files), then per kind:
 //            files:  u16 start bytes, u16 loop bytes (x4), u16 end bytes, u8 amplitude
 //            filter: a filter record (u8 type, f32 freq, f32 bandwidth, u8 enable)
 //   ops      until the input ends: u8 opcode, then its operands (see Op)

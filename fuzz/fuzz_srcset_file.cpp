@@ -1,6 +1,7 @@
-// Registers a source set from an arbitrary source-set file, plays a stroke with it, saves it and
-// registers the saved file again; then repeats the registration with an allocation failure
-// injected somewhere along the way.
+// Registers a source set from an arbitrary source-set file (the input in the chunk language of
+// file_script.h), plays a short stroke with it, saves it and registers the saved file again;
+// then repeats the registration with an allocation failure injected somewhere along the way.
+// One engine context serves every input (reset in between).
 //
 // Properties: no crash, leak or undefined behaviour; a registration either succeeds with
 // identifier 1 and error 0 or fails with a documented code and registers nothing; every
@@ -11,7 +12,9 @@
 #include <cstdint>
 #include <cstring>
 #include <string>
+#include <vector>
 
+#include "file_script.h"
 #include "fuzz_support.h"
 #include "util/kova_mem.h"
 
@@ -32,9 +35,7 @@ void play_and_resave(KOVA_CTX* ctx, const ScratchFile& saved, const ScratchFile&
     kova_get_rptinfo(ctx, 1, &rpt);
 
     FUZZ_CHECK(kova_set_active_src(ctx, 1) == KOVA_OK);
-    checked_stroke(ctx, 12, 16, 3840);    // a phone's usual burst
-    checked_stroke(ctx, 4, 199, 960000);  // the longest accepted step, the host's buffer
-    checked_stroke(ctx, 3, 3, 7);         // the shortest step, an odd tiny buffer
+    short_stroke(ctx);
 
     // A saved set, registered again, must save to the very same bytes.
     saved.remove();
@@ -72,37 +73,38 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     static const ScratchFile input("srcset-in");
     static const ScratchFile saved("srcset-saved");
     static const ScratchFile resaved("srcset-resaved");
-    input.rewrite(data, size);
+    const std::vector<uint8_t> file = expand_file(data, size);
+    input.rewrite(file.data(), file.size());
 
+    int32_t err = 0;
     {
-        Engine engine;
-        FUZZ_CHECK(engine.ctx() != nullptr);
-        int32_t err = 0;
-        const int32_t id = kova_reg_src_bysavefile(engine.ctx(), input.path(), &err);
+        const ReusedCtx engine(phone_format());
+        KOVA_CTX* ctx = engine.get();
+        FUZZ_CHECK(ctx != nullptr);
+        const int32_t id = kova_reg_src_bysavefile(ctx, input.path(), &err);
         if (id == 0) {
             FUZZ_CHECK(documented_failure(err));
-            FUZZ_CHECK(kova_get_src_num(engine.ctx()) == 0);
+            FUZZ_CHECK(kova_get_src_num(ctx) == 0);
         } else {
-            FUZZ_CHECK(id == 1 && err == KOVA_OK && kova_get_src_num(engine.ctx()) == 1);
-            play_and_resave(engine.ctx(), saved, resaved);
+            FUZZ_CHECK(id == 1 && err == KOVA_OK && kova_get_src_num(ctx) == 1);
+            play_and_resave(ctx, saved, resaved);
         }
     }
 
     // The same file with the n-th allocation failing (n taken from the input): a failure is
     // reported as such and leaves the context as it was.
     if (size > 0) {
-        Engine engine;
-        FUZZ_CHECK(engine.ctx() != nullptr);
+        const ReusedCtx engine(phone_format());
+        KOVA_CTX* ctx = engine.get();
         kova_mem_fail_after(static_cast<long>(data[size - 1] % 16));
-        int32_t err = 0;
-        const int32_t id = kova_reg_src_bysavefile(engine.ctx(), input.path(), &err);
+        const int32_t id = kova_reg_src_bysavefile(ctx, input.path(), &err);
         kova_mem_fail_after(-1);
         if (id == 0) {
             FUZZ_CHECK(documented_failure(err));
-            FUZZ_CHECK(kova_get_src_num(engine.ctx()) == 0);
+            FUZZ_CHECK(kova_get_src_num(ctx) == 0);
         } else {
             FUZZ_CHECK(id == 1 && err == KOVA_OK);
-            checked_stroke(engine.ctx(), 6, 16, 3840);
+            short_stroke(ctx);
         }
     }
     return 0;

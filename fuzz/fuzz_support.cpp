@@ -1,13 +1,13 @@
 #include "fuzz_support.h"
 
 #include <fcntl.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <cstdio>
 #include <cstdlib>
-#include <fstream>
-#include <iterator>
 
+#include "kova/kova_list.h"
 #include "util/kova_mem.h"
 
 #if defined(__has_feature)
@@ -29,10 +29,23 @@ void fail(const char* what, const char* file, int line) {
     std::abort();
 }
 
+namespace {
+
+// Scratch files live in memory where possible: on disk, rewriting a file per input costs more
+// in the kernel than the library's work on it.
+std::string scratch_dir() {
+    const char* dir = std::getenv("KOVA_FUZZ_SCRATCH");
+    if (dir != nullptr && *dir != '\0') return dir;
+    if (access("/dev/shm", W_OK | X_OK) == 0) return "/dev/shm";
+    const char* tmp = std::getenv("TMPDIR");
+    return tmp != nullptr && *tmp != '\0' ? tmp : "/tmp";
+}
+
+}  // namespace
+
 ScratchFile::ScratchFile(const char* tag) {
-    const char* dir = std::getenv("TMPDIR");
-    path_ = std::string(dir != nullptr && *dir != '\0' ? dir : "/tmp") + "/kova-fuzz-" +
-            std::to_string(getpid()) + "-" + tag;
+    static const std::string dir = scratch_dir();
+    path_ = dir + "/kova-fuzz-" + std::to_string(getpid()) + "-" + tag;
 }
 
 ScratchFile::~ScratchFile() {
@@ -44,21 +57,38 @@ void ScratchFile::remove() const {
 }
 
 void ScratchFile::rewrite(const void* data, size_t size) const {
-    const int fd = open(path_.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0600);
+    // Overwrite, then cut: pages a same-sized file already has are reused, not freed and
+    // zeroed again.
+    const int fd = open(path_.c_str(), O_WRONLY | O_CREAT, 0600);
     FUZZ_CHECK(fd >= 0);
     const auto* p = static_cast<const uint8_t*>(data);
-    while (size > 0) {
-        const ssize_t n = write(fd, p, size);
+    for (size_t left = size; left > 0;) {
+        const ssize_t n = write(fd, p, left);
         FUZZ_CHECK(n > 0);
         p += n;
-        size -= static_cast<size_t>(n);
+        left -= static_cast<size_t>(n);
     }
+    FUZZ_CHECK(ftruncate(fd, static_cast<off_t>(size)) == 0);
     close(fd);
 }
 
 std::string ScratchFile::read() const {
-    std::ifstream in(path_, std::ios::binary);
-    return std::string(std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>());
+    std::string bytes;
+    const int fd = open(path_.c_str(), O_RDONLY);
+    if (fd < 0) return bytes;
+    struct stat st {};
+    if (fstat(fd, &st) == 0 && st.st_size > 0) {
+        bytes.resize(static_cast<size_t>(st.st_size));
+        size_t done = 0;
+        while (done < bytes.size()) {
+            const ssize_t n = ::read(fd, &bytes[done], bytes.size() - done);
+            if (n <= 0) break;
+            done += static_cast<size_t>(n);
+        }
+        bytes.resize(done);
+    }
+    close(fd);
+    return bytes;
 }
 
 namespace {
@@ -138,18 +168,60 @@ bool same_tune(const KOVA_TUNE_SET& a, const KOVA_TUNE_SET& b) {
            f(a.end_gain, b.end_gain);
 }
 
+int64_t short_stroke(KOVA_CTX* ctx, int32_t buffer_bytes) {
+    return checked_stroke(ctx, 2, 4, buffer_bytes);
+}
+
+namespace {
+
+// The context kept across inputs and the images of its parts right after kova_init.
+struct Kept {
+    KOVA_CTX* ctx = nullptr;
+    KOVA_FORMAT format{};
+    KOVA_CTX fields{};
+    KOVA_PARAM prev{};
+    KOVA_OSC osc{};
+    KOVA_EQ eq{};
+};
+
+Kept& kept() {
+    static Kept k;
+    return k;
+}
+
+}  // namespace
+
+ReusedCtx::ReusedCtx(const KOVA_FORMAT& f) {
+    Kept& k = kept();
+    if (k.ctx != nullptr && same_bytes(k.format, f)) {
+        ctx_ = k.ctx;
+        return;
+    }
+    if (k.ctx != nullptr) FUZZ_CHECK(kova_deinit(k.ctx) == KOVA_OK);
+    k.format = f;
+    k.ctx = kova_init(&k.format, &err_);
+    if (k.ctx == nullptr) return;
+    k.fields = *k.ctx;
+    k.prev = *k.ctx->prev_param;
+    k.osc = *k.ctx->osc;
+    k.eq = *k.ctx->eq;
+    ctx_ = k.ctx;
+}
+
+ReusedCtx::~ReusedCtx() {
+    if (ctx_ == nullptr) return;
+    const Kept& k = kept();
+    LIST* sets = ctx_->src_list;
+    while (sets->count > 0) list_removeat(sets, 0, kova_free_sourceset);
+    // Every scalar back to its first value; the owned parts keep their addresses.
+    *ctx_ = k.fields;
+    *ctx_->prev_param = k.prev;
+    *ctx_->osc = k.osc;
+    *ctx_->eq = k.eq;
+}
+
 KOVA_FORMAT phone_format() {
     return KOVA_FORMAT{48000, 2, 1, 1080, 2280};
-}
-
-Engine::Engine() : Engine(phone_format()) {}
-
-Engine::Engine(const KOVA_FORMAT& f) : format_(f) {
-    ctx_ = kova_init(&format_, &err_);
-}
-
-Engine::~Engine() {
-    if (ctx_ != nullptr) FUZZ_CHECK(kova_deinit(ctx_) == KOVA_OK);
 }
 
 }  // namespace kova_fuzz

@@ -48,8 +48,9 @@ class Bytes {
     size_t left_;
 };
 
-// A file under the system's temporary directory, unique to this process and `tag`, removed when
-// the object goes away. rewrite() replaces the whole content.
+// A file on memory-backed storage (KOVA_FUZZ_SCRATCH, else /dev/shm, else TMPDIR or /tmp),
+// unique to this process and `tag`, removed when the object goes away. rewrite() replaces the
+// whole content in place (no truncation to 0 and regrowth: the file is cut to the new size).
 class ScratchFile {
    public:
     explicit ScratchFile(const char* tag);
@@ -99,22 +100,29 @@ int64_t checked_stroke(KOVA_CTX* ctx, int moves, int dt_ms, int32_t buffer_bytes
 // The usual engine format: 48000 Hz stereo with position panning on a 1080 x 2280 screen.
 KOVA_FORMAT phone_format();
 
-// A context with phone_format() that deinitialises itself.
-class Engine {
+// One engine context kept across inputs: creating one per input costs more than most inputs.
+// A ReusedCtx hands it out exactly as kova_init left it (a different format replaces it), and on
+// leaving the scope frees the sets registered meanwhile and restores every field, the oscillator
+// and the equaliser from the images taken after kova_init. So each execution frees what it
+// allocated, as libFuzzer's leak check expects. get() is null for a format kova_init refuses.
+class ReusedCtx {
    public:
-    Engine();
-    explicit Engine(const KOVA_FORMAT& f);
-    ~Engine();
-    Engine(const Engine&) = delete;
-    Engine& operator=(const Engine&) = delete;
-    KOVA_CTX* ctx() const { return ctx_; }
+    explicit ReusedCtx(const KOVA_FORMAT& f);
+    ~ReusedCtx();
+    ReusedCtx(const ReusedCtx&) = delete;
+    ReusedCtx& operator=(const ReusedCtx&) = delete;
+    KOVA_CTX* get() const { return ctx_; }
     int32_t init_error() const { return err_; }
 
    private:
-    KOVA_FORMAT format_;
-    int32_t err_ = 0;
-    KOVA_CTX* ctx_;
+    KOVA_CTX* ctx_ = nullptr;
+    int32_t err_ = KOVA_OK;
 };
+
+// A short stroke for the targets whose subject is a file, not generation (which the generation
+// target covers): down, two moves 4 ms apart, up, with buffers of `buffer_bytes`. Enough to
+// show that a set read from the file plays within its bounds.
+int64_t short_stroke(KOVA_CTX* ctx, int32_t buffer_bytes = 256);
 
 // Bitwise equality of two records (so NaN payloads compare equal to themselves).
 template <typename T>

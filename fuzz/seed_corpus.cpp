@@ -1,7 +1,9 @@
 // Writes the seed corpora of the fuzz targets, made by the library itself:
 //   OUT/srcset    source-set files saved through the engine: 0 to 4 filters times every
-//                 combination of present slots (also the seeds of the file queries);
-//   OUT/pcm       inputs of the PCM target: three raw files of assorted lengths, some beyond the
+//                 combination of present slots, and files whose payloads sit at, just below and
+//                 just above every slot limit (also the seeds of the file queries); written in
+//                 the chunk language of file_script.h;
+//   OUT/pcm       inputs of the PCM target: three files of assorted lengths, at and beyond the
 //                 slot limits;
 //   OUT/generate  scripts of realistic strokes for the generation target.
 // Usage: kova_fuzz_seeds OUT
@@ -14,8 +16,10 @@
 #include <vector>
 
 #include "event_script.h"
+#include "file_script.h"
 #include "kova/kova.h"
 
+using kova_fuzz::FileScript;
 using kova_fuzz::ScriptWriter;
 
 namespace {
@@ -34,6 +38,17 @@ void write_file(const std::string& path, const void* data, size_t size) {
     }
 }
 
+std::vector<uint8_t> read_whole(const std::string& path) {
+    std::vector<uint8_t> bytes;
+    FILE* f = std::fopen(path.c_str(), "rb");
+    if (f == nullptr) die("cannot read " + path);
+    uint8_t buf[4096];
+    size_t n = 0;
+    while ((n = std::fread(buf, 1, sizeof buf, f)) > 0) bytes.insert(bytes.end(), buf, buf + n);
+    std::fclose(f);
+    return bytes;
+}
+
 std::vector<uint8_t> tone(size_t bytes, int step) {
     std::vector<uint8_t> pcm(bytes);
     for (size_t i = 0; i + 1 < bytes; i += 2) {
@@ -42,6 +57,43 @@ std::vector<uint8_t> tone(size_t bytes, int step) {
         pcm[i + 1] = static_cast<uint8_t>((s >> 8) & 0xFF);
     }
     return pcm;
+}
+
+// A stored source record: 48 bytes, size at 24, slot at 32, repeat points at 40 and 44.
+std::vector<uint8_t> src_record(int32_t size, int32_t slot) {
+    std::vector<uint8_t> r(48, 0);
+    const int32_t fields[][2] = {{24, size}, {32, slot}, {40, 0}, {44, size}};
+    for (const auto& f : fields) {
+        for (int k = 0; k < 4; ++k) r[f[0] + k] = static_cast<uint8_t>(f[1] >> (8 * k));
+    }
+    return r;
+}
+
+// Files with every slot's payload at `delta` bytes from its limit (38400/192000/38400), one
+// lowpass filter (disabled: filtering 270 KB per execution would slow the whole run; a mutation
+// that enables it still can), the tune set of a registration from files.
+void limit_seeds(const std::string& dir) {
+    const int32_t limits[KOVA_SLOT_COUNT] = {KOVA_SLOT_START_MAX_BYTES, KOVA_SLOT_LOOP_MAX_BYTES,
+                                             KOVA_SLOT_END_MAX_BYTES};
+    for (int32_t delta : {0, -2, 2, 1000}) {
+        FileScript w;
+        const int32_t one = 1;
+        w.literal(&one, 4);
+        const KOVA_FLT_DSC lowpass{KOVA_FLT_LOWPASS, 4000.0, 1.0, 0, 48000, 2};
+        w.literal(&lowpass, sizeof lowpass);
+        const KOVA_TUNE_SET tune{1.0, 0.4, 0, 1.0, 0, 0.2, 0.0, 0.4, 0.6, 0.9, 0.6};
+        w.literal(&tune, sizeof tune);
+        const int32_t info[5] = {1, 1, 1, 48000, 2};
+        w.literal(info, sizeof info);
+        for (int slot = 0; slot < KOVA_SLOT_COUNT; ++slot) {
+            const std::vector<uint8_t> rec = src_record(limits[slot] + delta, slot);
+            w.literal(rec.data(), rec.size());
+            w.run(static_cast<uint32_t>(limits[slot] + delta), static_cast<uint8_t>(3 + slot));
+        }
+        char name[64];
+        std::snprintf(name, sizeof name, "/limits%+d.kss", delta);
+        write_file(dir + name, w.bytes().data(), w.bytes().size());
+    }
 }
 
 // 0 to 4 filters times the 8 slot combinations. A set always gets its loop from a file; slots
@@ -95,32 +147,45 @@ void srcset_seeds() {
             unlink(path.c_str());
             if (kova_save_source(ctx, 1, path.c_str()) <= 0) die("save failed: " + path);
             kova_deinit(ctx);
+            // The saved file, as literal chunks.
+            const std::vector<uint8_t> file = read_whole(path);
+            FileScript in;
+            in.literal(file.data(), file.size());
+            write_file(path, in.bytes().data(), in.bytes().size());
         }
     }
     for (const auto& p : pcm_path) unlink(p.c_str());
+    limit_seeds(dir);
 }
 
-void pcm_seed(const char* name, uint16_t start, uint16_t end, size_t loop) {
+// A PCM input: per slot (start, loop, end) a length mode and value (see fuzz_pcm_load.cpp:
+// 0 small, 0xFD limit minus, 0xFE limit plus, 0xFF value x 8), then one period of a tone that
+// the files repeat.
+struct PcmLen {
+    uint8_t mode;
+    uint16_t value;
+};
+void pcm_seed(const char* name, PcmLen start, PcmLen loop, PcmLen end) {
     std::vector<uint8_t> in;
-    const uint16_t lens[2] = {start, end};
-    for (uint16_t v : lens) {
-        in.push_back(static_cast<uint8_t>(v & 0xFF));
-        in.push_back(static_cast<uint8_t>(v >> 8));
+    for (const PcmLen& l : {start, loop, end}) {
+        in.push_back(l.mode);
+        in.push_back(static_cast<uint8_t>(l.value & 0xFF));
+        in.push_back(static_cast<uint8_t>(l.value >> 8));
     }
-    for (size_t bytes : {static_cast<size_t>(start), static_cast<size_t>(end), loop}) {
-        const std::vector<uint8_t> pcm = tone(bytes, 500);
-        in.insert(in.end(), pcm.begin(), pcm.end());
-    }
+    const std::vector<uint8_t> period = tone(128, 500);
+    in.insert(in.end(), period.begin(), period.end());
     write_file(g_out + "/pcm/" + name, in.data(), in.size());
 }
 
 void pcm_seeds() {
     mkdir((g_out + "/pcm").c_str(), 0755);
-    pcm_seed("small", 64, 32, 256);
-    pcm_seed("odd-lengths", 45, 3, 1001);
-    pcm_seed("loop-only", 0, 0, 4000);
-    pcm_seed("no-loop", 100, 100, 0);
-    pcm_seed("over-limits", 39999, 38401, 192001);  // every slot cut at its limit
+    pcm_seed("small", {0, 64}, {0, 256}, {0, 32});
+    pcm_seed("odd-lengths", {0, 45}, {0, 1001}, {0, 3});
+    pcm_seed("loop-only", {0, 0}, {0, 4000}, {0, 0});
+    pcm_seed("no-loop", {0, 100}, {0, 0}, {0, 100});
+    pcm_seed("at-limits", {0xFD, 0}, {0xFD, 0}, {0xFD, 0});
+    pcm_seed("below-limits", {0xFD, 1}, {0xFD, 2}, {0xFD, 3});
+    pcm_seed("over-limits", {0xFE, 1}, {0xFE, 2}, {0xFE, 63});  // every slot cut at its limit
 }
 
 // Buffer selectors: the host's 960000-byte buffer, a 3840-byte burst, tiny odd sizes.
@@ -161,6 +226,17 @@ void generate_seeds() {
         generate_seed("phone-files", w);
     }
     {
+        ScriptWriter w;  // file sources at the slot limits (38400, 4 x 48000, 38400), then past
+        w.header(7, false, true, 1080, 2280).files(38400, 48000, 38400, 100);
+        stroke(w, 8, 12, 20, 16, kBuf3840);
+        stroke(w, 4, 30, 20, 199, kBufHost);
+        generate_seed("files-at-limits", w);
+        ScriptWriter v;
+        v.header(7, false, true, 1080, 2280).files(40000, 48500, 39000, 100);
+        stroke(v, 8, 12, 20, 16, kBuf3840);
+        generate_seed("files-past-limits", v);
+    }
+    {
         ScriptWriter w;  // noise source, oscillator and pitch raise on, mono at 8 kHz
         w.header(0, true, false, 720, 1280).filter(KOVA_FLT_BANDPASS, 1200.0f, 0.7f);
         w.tune_scaled(tune_sharp_osc);
@@ -175,14 +251,8 @@ void generate_seeds() {
         generate_seed("fast-clipping", w);
     }
     {
-        ScriptWriter w;  // set management between strokes
-        w.header(7, false, true, 1080, 2280)
-            .u8(kova_fuzz::kSourceBoth)
-            .u16(800)
-            .u16(1000)
-            .u16(800)
-            .u8(90);
-        w.filter_record(KOVA_FLT_LOWPASS, 3000.0f, 1.0f, 1);
+        ScriptWriter w;  // set management between strokes (file sources: noise is costly)
+        w.header(7, false, true, 1080, 2280).files(800, 1000, 800, 90);
         stroke(w, 6, 10, 10, 16, kBuf3840);
         w.admin(kova_fuzz::kAdminSelect).u8(1);
         w.thickness(200);

@@ -2,6 +2,8 @@
 #include <time.h>
 
 #include <algorithm>
+#include <atomic>
+#include <chrono>
 #include <bit>
 #include <cerrno>
 
@@ -43,66 +45,124 @@ void sleep_until(timespec& deadline) {
 
 }  // namespace
 
+/* Everything the callback thread uses; co-owned by the track and the thread, so a thread that
+ * outlives a bounded release still has it. */
+struct TrackThread::State {
+    State(android::AudioTrack::callback_t callback, void* user, uint32_t rate, uint32_t channels,
+          std::unique_ptr<AudioSink> sink)
+        : callback(callback),
+          user(user),
+          burstFrames(std::max<size_t>(1, static_cast<size_t>(rate) * kPeriodNs / kNsPerSecond)),
+          burstBytes(burstFrames * channels * sizeof(int16_t)),
+          sink(std::move(sink)),
+          room(burstBytes) {}
+
+    bool active_locked() const { return active && !exit; }
+    void pull_burst();
+    void run();
+
+    const android::AudioTrack::callback_t callback;
+    void* const user;
+    const size_t burstFrames;
+    const size_t burstBytes;
+    std::unique_ptr<AudioSink> sink;
+    std::vector<uint8_t> room;
+    // Outlives each callback: the callee may keep its address.
+    android::AudioTrack::Buffer buffer{};
+
+    std::mutex lock;
+    std::condition_variable wake;
+    bool active = false;
+    bool exit = false;
+    bool done = false;       // run() has finished with the sink and the callback
+    bool lingering = false;  // released before done; counted in g_lingering
+
+    /* Held around each callback and by the release while it sets `exit`: once the release has
+     * it, no callback runs and none will. Never held while the sink is called. */
+    std::mutex callbackLock;
+};
+
+namespace {
+std::atomic<size_t> g_lingering{0};
+}
+
+size_t lingering_tracks() {
+    return g_lingering.load();
+}
+
 TrackThread::TrackThread(android::AudioTrack::callback_t callback, void* user, uint32_t rate,
                          uint32_t channels, std::unique_ptr<AudioSink> sink)
-    : mCallback(callback),
-      mUser(user),
-      mBurstFrames(std::max<size_t>(1, static_cast<size_t>(rate) * kPeriodNs / kNsPerSecond)),
-      mBurstBytes(mBurstFrames * channels * sizeof(int16_t)),
-      mSink(std::move(sink)),
-      mRoom(mBurstBytes),
-      mThread(&TrackThread::run, this) {}
+    : mState(std::make_shared<State>(callback, user, rate, channels, std::move(sink))),
+      mThread([state = mState] { state->run(); }) {}
 
 TrackThread::~TrackThread() {
+    State& s = *mState;
     {
-        std::lock_guard<std::mutex> guard(mLock);
-        mExit = true;
+        std::lock_guard<std::mutex> callbacks(s.callbackLock);
+        std::lock_guard<std::mutex> guard(s.lock);
+        s.exit = true;
     }
-    mWake.notify_all();
-    mThread.join();
+    s.wake.notify_all();
+    std::unique_lock<std::mutex> guard(s.lock);
+    if (s.wake.wait_for(guard, std::chrono::nanoseconds(kReleaseWaitNs), [&s] { return s.done; })) {
+        guard.unlock();
+        mThread.join();
+        return;
+    }
+    s.lingering = true;
+    g_lingering.fetch_add(1);
+    guard.unlock();
+    mThread.detach();
 }
 
 void TrackThread::start() {
     {
-        std::lock_guard<std::mutex> guard(mLock);
-        mActive = true;
+        std::lock_guard<std::mutex> guard(mState->lock);
+        mState->active = true;
     }
-    mWake.notify_all();
+    mState->wake.notify_all();
 }
 
 void TrackThread::stop() {
-    std::lock_guard<std::mutex> guard(mLock);
-    mActive = false;
+    std::lock_guard<std::mutex> guard(mState->lock);
+    mState->active = false;
 }
 
-void TrackThread::pull_burst() {
+void TrackThread::State::pull_burst() {
     if (device_held()) return;
     // A callback that claims the burst without filling it plays silence, not the previous burst.
-    std::fill(mRoom.begin(), mRoom.end(), uint8_t{0});
-    mBuffer.frameCount = mBurstFrames;
-    mBuffer.size = mBurstBytes;
-    mBuffer.raw = mRoom.data();
-    mCallback(android::AudioTrack::EVENT_MORE_DATA, mUser, &mBuffer);
-    const size_t got = std::min(mBuffer.size, mBurstBytes);
+    std::fill(room.begin(), room.end(), uint8_t{0});
+    {
+        std::lock_guard<std::mutex> callbacks(callbackLock);
+        {
+            std::lock_guard<std::mutex> guard(lock);
+            if (exit) return;
+        }
+        buffer.frameCount = burstFrames;
+        buffer.size = burstBytes;
+        buffer.raw = room.data();
+        callback(android::AudioTrack::EVENT_MORE_DATA, user, &buffer);
+    }
+    const size_t got = std::min(buffer.size, burstBytes);
     {
         // A burst whose track was stopped while the callback ran is not played.
-        std::lock_guard<std::mutex> guard(mLock);
+        std::lock_guard<std::mutex> guard(lock);
         if (!active_locked()) {
             count_callback(false);
             return;
         }
     }
-    count_callback(got < mBurstBytes);
-    mSink->write(mRoom.data(), got);
+    count_callback(got < burstBytes);
+    sink->write(room.data(), got);
 }
 
-void TrackThread::run() {
-    std::unique_lock<std::mutex> lock(mLock);
+void TrackThread::State::run() {
+    std::unique_lock<std::mutex> guard(lock);
     for (;;) {
-        mWake.wait(lock, [this] { return mExit || mActive; });
-        if (mExit) return;
-        lock.unlock();
-        mSink->start();
+        wake.wait(guard, [this] { return exit || active; });
+        if (exit) break;
+        guard.unlock();
+        sink->start();
         timespec deadline{};
         clock_gettime(CLOCK_MONOTONIC, &deadline);
         // Like a device that plays out its first period before it asks for more, the first pull
@@ -110,22 +170,29 @@ void TrackThread::run() {
         // the first burst is real data, not a request it still refuses.
         advance(deadline, kPeriodNs);
         sleep_until(deadline);
-        lock.lock();
-        // The callback runs without mLock held: it takes the stream's own lock, under which the
+        guard.lock();
+        // The callback runs without `lock` held: it takes the stream's own lock, under which the
         // stream calls stop().
         while (active_locked()) {
-            lock.unlock();
+            guard.unlock();
             pull_burst();
-            if (!mSink->paced()) {
+            if (!sink->paced()) {
                 advance(deadline, kPeriodNs);
                 sleep_until(deadline);
             }
-            lock.lock();
+            guard.lock();
         }
-        lock.unlock();
-        mSink->stop();
-        lock.lock();
+        guard.unlock();
+        sink->stop();
+        guard.lock();
     }
+    guard.unlock();
+    sink.reset();  // the device is closed before the thread counts as ended
+    guard.lock();
+    done = true;
+    if (lingering) g_lingering.fetch_sub(1);
+    guard.unlock();
+    wake.notify_all();
 }
 
 }  // namespace kova_host

@@ -1,11 +1,15 @@
 #include "sink_registry.h"
 
+#include "track_thread.h"
+
 #include <sndfile.h>
 
 #include <algorithm>
 #include <atomic>
+#include <chrono>
 #include <cstring>
 #include <mutex>
+#include <thread>
 #include <vector>
 
 namespace kova_host {
@@ -37,6 +41,23 @@ class CaptureSink final : public AudioSink {
         store.bytes.insert(store.bytes.end(), p, p + bytes);
     }
 };
+
+/* A device that takes `stall` to accept each burst, then discards it. */
+class StallSink final : public AudioSink {
+   public:
+    explicit StallSink(std::chrono::milliseconds stall) : mStall(stall) {}
+    void write(const void*, size_t) override { std::this_thread::sleep_for(mStall); }
+    bool paced() const override { return true; }
+
+   private:
+    const std::chrono::milliseconds mStall;
+};
+
+std::atomic<uint32_t> g_stall_ms{0};
+
+std::unique_ptr<AudioSink> make_stall(uint32_t, uint32_t) {
+    return std::make_unique<StallSink>(std::chrono::milliseconds(g_stall_ms.load()));
+}
 
 std::unique_ptr<AudioSink> make_null(uint32_t, uint32_t) {
     return std::make_unique<NullSink>();
@@ -86,6 +107,19 @@ void kova_host_use_capture_sink(void) {
 }
 void kova_host_use_null_sink(void) {
     kova_host::use_sink_factory(kova_host::make_null);
+}
+
+void kova_host_use_stall_sink(uint32_t stall_ms) {
+    if (stall_ms == 0) {
+        kova_host::use_sink_factory(kova_host::make_null);
+        return;
+    }
+    kova_host::g_stall_ms.store(stall_ms);
+    kova_host::use_sink_factory(kova_host::make_stall);
+}
+
+size_t kova_host_lingering_tracks(void) {
+    return kova_host::lingering_tracks();
 }
 
 size_t kova_host_capture_size(void) {

@@ -14,38 +14,35 @@
 
 namespace kova_host {
 
-/* Pulls bursts from the track's callback at the device's pace while started. */
+/* Pulls bursts from the track's callback at the device's pace while started.
+ *
+ * Release is bounded: the destructor tells the thread to stop, waits for a callback already
+ * running (callbacks never block on the device), and then waits at most kReleaseWaitNs for the
+ * thread to end. A thread held up longer by its sink (a device that never drains, a stalled
+ * write) is left to finish alone: everything it still uses is in a state record it co-owns, and
+ * it never calls the callback again, so the callback's user data may go as soon as the
+ * destructor returns. */
 class TrackThread {
    public:
-    static constexpr long kPeriodNs = 4'000'000;  // 4 ms per burst: 192 frames at 48000 Hz
+    static constexpr long kPeriodNs = 4'000'000;         // 4 ms per burst: 192 frames at 48000 Hz
+    static constexpr long kReleaseWaitNs = 100'000'000;  // 100 ms
 
     TrackThread(android::AudioTrack::callback_t callback, void* user, uint32_t rate,
                 uint32_t channels, std::unique_ptr<AudioSink> sink);
-    ~TrackThread();  // stops and joins
+    ~TrackThread();
 
     void start();
     void stop();
 
+    struct State;
+
    private:
-    void run();
-    bool active_locked() const { return mActive && !mExit; }
-    void pull_burst();
-
-    const android::AudioTrack::callback_t mCallback;
-    void* const mUser;
-    const size_t mBurstFrames;
-    const size_t mBurstBytes;
-    std::unique_ptr<AudioSink> mSink;
-    std::vector<uint8_t> mRoom;
-    android::AudioTrack::Buffer
-        mBuffer{};  // outlives each callback: the callee may keep its address
-
-    std::mutex mLock;
-    std::condition_variable mWake;
-    bool mActive = false;
-    bool mExit = false;
-    std::thread mThread;  // last: starts once everything above is set up
+    std::shared_ptr<State> mState;
+    std::thread mThread;
 };
+
+/* Released tracks whose thread has not ended yet. */
+size_t lingering_tracks();
 
 }  // namespace kova_host
 

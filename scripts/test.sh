@@ -3,7 +3,8 @@
 #   1. setup: installs what is missing;
 #   2. plain build + CTest, then valgrind's leak check over the allocation-failure suite and a
 #      20-second soak of several instances streaming at once;
-#   3. AddressSanitizer + UndefinedBehaviorSanitizer build + CTest, with leak detection;
+#   3. AddressSanitizer + UndefinedBehaviorSanitizer build + CTest, with leak detection and
+#      float-to-integer overflow checks (GCC leaves float-cast-overflow out of "undefined");
 #   4. ThreadSanitizer build of the threaded suites (output stream, registry, Java layer, soak);
 #   5. libFuzzer targets (clang): seed corpora made by the library, replay of seeds and saved
 #      regressions, then a bounded fuzzing run per target;
@@ -11,10 +12,12 @@
 #      x86-64 and AArch64 (scripts/aarch64.sh);
 #   7. consumer: install into a temporary prefix, then find_package, pkg-config, the README's C
 #      snippet and add_subdirectory (scripts/consumer.sh);
-#   8. docs: the API reference (kova_docs: Doxygen, warnings are errors, every export named).
+#   8. docs: the API reference (kova_docs: Doxygen, warnings are errors, every export named);
+#   9. studio: the engine built to WebAssembly and its page tested in headless Chromium against
+#      the native library (scripts/studio.sh --test).
 # Environment: KOVA_JOBS (parallel jobs), KOVA_SOAK_SECONDS (default 20), KOVA_FUZZ_SECONDS
 # (per target, default 60), KOVA_SKIP (space-separated stage names to skip: valgrind soak tsan
-# fuzz aarch64 consumer docs).
+# fuzz aarch64 consumer docs studio).
 set -euo pipefail
 root=$(cd "$(dirname "$0")/.." && pwd)
 cd "$root"
@@ -78,7 +81,8 @@ fi
 # LeakSanitizer runs at the exit of every test process: a leak fails the test.
 export ASAN_OPTIONS=detect_leaks=1
 export UBSAN_OPTIONS=print_stacktrace=1
-run_suite build-asan -DKOVA_SANITIZE=address,undefined -DKOVA_BUILD_BENCH=OFF -DKOVA_BUILD_TOOLS=OFF
+run_suite build-asan -DKOVA_SANITIZE=address,undefined,float-cast-overflow -DKOVA_BUILD_BENCH=OFF \
+    -DKOVA_BUILD_TOOLS=OFF
 unset ASAN_OPTIONS UBSAN_OPTIONS
 stage_done "asan/ubsan build + ctest"
 
@@ -114,9 +118,10 @@ if ! skipped fuzz; then
     rm -rf "$dir/seeds"
     "$dir/fuzz/kova_fuzz_seeds" "$dir/seeds"
     fuzz_seconds=${KOVA_FUZZ_SECONDS:-60}
-    # target:seed corpus:largest input to generate
+    # target:seed corpus:largest input to generate. File inputs are chunked (fuzz/file_script.h)
+    # and PCM inputs give lengths, so short inputs reach every slot limit.
     for entry in srcset_file:srcset:16384 file_queries:srcset:16384 pcm_load:pcm:8192 \
-        generate:generate:4096; do
+        generate:generate:2048; do
         IFS=: read -r target seeds max_len <<<"$entry"
         bin=$dir/fuzz/kova_fuzz_$target
         work=$dir/corpus/$target
@@ -141,6 +146,11 @@ fi
 if ! skipped aarch64; then
     scripts/aarch64.sh build
     stage_done "aarch64 cross build + qemu tests"
+fi
+
+if ! skipped studio; then
+    KOVA_JOBS=$jobs scripts/studio.sh --test
+    stage_done "studio wasm build + browser tests"
 fi
 
 echo "== stage times"

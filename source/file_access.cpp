@@ -1,6 +1,7 @@
 // File-access layer: eight operations over a POSIX descriptor, reached only through a TARQ_MFAL
 // filled by tarq_mfal_init.
 #include <fcntl.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <cstring>
@@ -22,9 +23,20 @@ void* tarq_mfal_open(TARQ_MFAL* m, int mode) {
     if (fd_cell == nullptr) return nullptr;
     *fd_cell = -1;
     // Writing never truncates: a longer old file keeps its tail beyond the new data.
-    const int fd = (mode & 1) ? ::open(m->path, O_RDWR | O_CREAT, 0644)
-                              : ::open(m->path, O_RDONLY | O_LARGEFILE);
+    // O_NONBLOCK: opening a FIFO would otherwise wait for its other end forever (and through Java
+    // it would wait under the process-wide registry lock). Only regular files are used at all: a
+    // FIFO, device, socket or directory is refused here, before anything is read or written.
+    const int flags = O_NONBLOCK | O_NOCTTY | O_LARGEFILE | O_CLOEXEC;
+    const int fd = (mode & 1) ? ::open(m->path, O_RDWR | O_CREAT | flags, 0644)
+                              : ::open(m->path, O_RDONLY | flags);
     if (fd < 0) {
+        kova_mem_free(fd_cell);
+        return nullptr;
+    }
+    struct stat st {};
+    if (::fstat(fd, &st) != 0 || !S_ISREG(st.st_mode) ||
+        ::fcntl(fd, F_SETFL, ::fcntl(fd, F_GETFL) & ~O_NONBLOCK) != 0) {
+        ::close(fd);
         kova_mem_free(fd_cell);
         return nullptr;
     }

@@ -1,10 +1,12 @@
 // Queries that read single items out of a saved source-set file, without an engine.
 //
-// Results: 0 once the file was opened and understood; -3 for a null path or output, a file that
-// cannot be opened (or no memory to open it), or a stored filter count above kMaxStoredFilters
-// (not a file the library wrote; the set reader refuses it too); -2 (filter query) when memory
-// for the working descriptor ran out. Records cut short by the end of the file are treated as
-// not there: the outputs they would fill keep what the caller put in them.
+// Results: 0 once the file was opened; -3 for a null path or output, or a file that cannot be
+// opened (or no memory to open it); -2 (filter query) when memory for the working descriptor ran
+// out. The file is read as its layout says: positions follow the bytes each read returned, any
+// stored filter count is followed (the loop over descriptors stops where the file ends), and a
+// record read in part counts, with zeros where the file ended. Records not reached at all leave
+// the outputs they would fill as the caller set them.
+#include <algorithm>
 #include <cmath>
 #include <cstddef>
 #include <cstdint>
@@ -31,14 +33,20 @@ struct QueryFile {
     int32_t count = 0;        // filter count, 0 when unreadable or negative
     int64_t after_count = 0;  // bytes the count read returned
 
-    // False (-3 for the caller) when the file cannot be opened or its count is not believable.
+    // False (-3 for the caller) when the file cannot be opened.
     bool open(const char* path) {
         if (!file.open(path, 0)) return false;
         int32_t stored = 0;
         const int r = _read_flt_size(file.handle(), file.mfal(), &stored);
-        if (r == kCountBytes) count = stored > 0 ? stored : 0;
+        if (r >= 1) count = stored > 0 ? stored : 0;  // a count read in part has zero high bytes
         after_count = r > 0 ? r : 0;
-        return count <= kMaxStoredFilters;
+        return true;
+    }
+    // Descriptors the file can hold after the count: reading more would only return nothing.
+    int64_t descriptors_held() {
+        int64_t size = 0;
+        if (file.mfal()->getsize(file.handle(), &size) != 0) return 0;
+        return (size - after_count + kFltDscBytes - 1) / kFltDscBytes;
     }
     int64_t tune_offset() const { return after_count + int64_t{kFltDscBytes} * count; }
     bool seek(int64_t pos) { return file.mfal()->setpos(file.handle(), &pos) == 0; }
@@ -63,23 +71,24 @@ struct SourceWalk {
         pos = at + (r > 0 ? r : 0);
     }
 
-    // Reads the next stored record; on success `payload` is its payload's offset and the walk
-    // moves past the payload. Positions stay within what a 32-bit offset can report.
+    // Reads the next stored record (at least 1 byte of it; the rest reads as 0); on success
+    // `payload` is its payload's offset and the walk moves on by the stored size, which may be
+    // negative. Positions stay within what a 32-bit offset can report.
     bool next(KOVA_SRC* record, int32_t* payload) {
-        if (lost || !q_.seek(pos)) return fail();
-        unsigned char image[kSrcRecordBytes];
+        if (lost || pos < 0 || !q_.seek(pos)) return fail();
+        unsigned char image[kSrcRecordBytes] = {};
         const int r = q_.read(image, kSrcRecordBytes);
-        if (r != kSrcRecordBytes) return fail();
+        if (r < 1) return fail();
         // The reference words (addresses when it was written) are not read.
         *record = KOVA_SRC{};
-        record->size = load<int32_t>(image, offsetof(KOVA_SRC, size));
-        record->rpt_start = load<int32_t>(image, offsetof(KOVA_SRC, rpt_start));
-        record->rpt_end = load<int32_t>(image, offsetof(KOVA_SRC, rpt_end));
+        record->size = load<int32_t>(image, kSrcSizeAt);
+        record->rpt_start = load<int32_t>(image, kSrcRptStartAt);
+        record->rpt_end = load<int32_t>(image, kSrcRptEndAt);
         pos += r;
-        if (record->size < 0 || pos > INT32_MAX) return fail();
+        if (pos > INT32_MAX) return fail();
         *payload = static_cast<int32_t>(pos);
         pos += record->size;
-        lost = pos > INT32_MAX;  // the next record has no 32-bit offset
+        lost = pos > INT32_MAX || pos < 0;  // the next record has no 32-bit offset
         return true;
     }
 
@@ -121,17 +130,29 @@ KOVA_API int kova_get_filters_fromfile(const char* path, KOVA_FLT_DSC flt[KOVA_F
     if (path == nullptr || flt == nullptr) return KOVA_ERR_INVALID_PARAM;
     QueryFile q;
     if (!q.open(path)) return KOVA_ERR_INVALID_PARAM;
-    auto* dsc = static_cast<KOVA_FLT_DSC*>(kova_mem_malloc(sizeof(KOVA_FLT_DSC)));
-    if (dsc == nullptr) return KOVA_ERR_INSUFF_MEM;
-    for (int32_t i = 0; i < q.count; ++i) {
-        *dsc = KOVA_FLT_DSC{};
-        // Only the descriptors the set reader would keep name an element; a later one of the
-        // same type replaces an earlier one.
-        if (_read_KOVA_FLT_DSC(q.file.handle(), q.file.mfal(), dsc) != kFltDscBytes) continue;
-        if (!filter_dsc_ok(dsc, FilterUse::kStored)) continue;
-        std::memcpy(&flt[dsc->type], dsc, sizeof(KOVA_FLT_DSC));
+    // Descriptors are read a batch at a time: the same bytes as one read per descriptor (the
+    // file is read straight on), without a system call for each of a large count.
+    constexpr int64_t kBatch = 64;
+    auto* batch = static_cast<unsigned char*>(kova_mem_malloc(kBatch * kFltDscBytes));
+    if (batch == nullptr) return KOVA_ERR_INSUFF_MEM;
+    // Past the end of the file every read returns nothing, so the loop stops there.
+    for (int64_t left = std::min<int64_t>(q.count, q.descriptors_held()); left > 0;) {
+        const int64_t n = std::min(left, kBatch);
+        const int got = q.read(batch, static_cast<int>(n * kFltDscBytes));
+        if (got < 1) break;
+        for (int64_t k = 0; k * kFltDscBytes < got; ++k) {
+            // A descriptor read in part counts (zeros where the file ended); its type names the
+            // element, and a later one of the same type replaces an earlier one.
+            KOVA_FLT_DSC dsc{};
+            std::memcpy(
+                &dsc, batch + k * kFltDscBytes,
+                static_cast<size_t>(std::min<int64_t>(kFltDscBytes, got - k * kFltDscBytes)));
+            if (filter_dsc_ok(&dsc, FilterUse::kType)) std::memcpy(&flt[dsc.type], &dsc, sizeof dsc);
+        }
+        if (got < n * kFltDscBytes) break;  // the end of the file
+        left -= n;
     }
-    kova_mem_free(dsc);
+    kova_mem_free(batch);
     printf("kova_get_filters_fromfile(%s)\n", path);
     return KOVA_OK;
 }
@@ -159,14 +180,10 @@ KOVA_API int kova_get_rptinfo_fromfile(const char* path, KOVA_RPT_INFO* info) {
     QueryFile q;
     if (!q.open(path)) return KOVA_ERR_INVALID_PARAM;
     SourceWalk walk(q);
-    int32_t rate = walk.info.samplerate;
-    int32_t channels = walk.info.channels;
-    // A stored format the engine cannot run at is not a format: convert with the defaults so
-    // no conversion divides by zero or overflows.
-    if (rate < 8000 || rate > 48000 || channels < 1 || channels > 2) {
-        rate = 48000;
-        channels = 2;
-    }
+    // The stored format converts as it stands: _cvt_byte_to_ms answers 0 for a format without
+    // samples per second instead of dividing by zero.
+    const int32_t rate = walk.info.samplerate;
+    const int32_t channels = walk.info.channels;
     for (int slot = 0; slot < KOVA_SLOT_COUNT; ++slot) {
         if (walk.info.has_src[slot] != 1) {
             info->len_ms[slot] = 0;

@@ -17,8 +17,9 @@ constexpr int32_t kMaxFilterRate = 384000;
 bool filter_dsc_ok(const KOVA_FLT_DSC* dsc, FilterUse use) {
     if (dsc == nullptr || dsc->type >= KOVA_FLT_TYPE_COUNT) return false;
     if (use == FilterUse::kType) return true;
-    if (dsc->channels < 1 || dsc->channels > 2) return false;
+    if (dsc->channels > kMaxStoredChannels) return false;
     if (use == FilterUse::kStored) return true;
+    if (dsc->channels < 1 || dsc->channels > 2) return false;
     if (dsc->samplerate <= 0 || dsc->samplerate > kMaxFilterRate) return false;
     if (!std::isfinite(dsc->freq) || !std::isfinite(dsc->bandwidth)) return false;
     const double nyquist = dsc->samplerate / 2.0;

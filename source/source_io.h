@@ -25,9 +25,9 @@ constexpr int32_t slot_max_bytes(int slot) {
 }
 constexpr int32_t kLargestSlotBytes = KOVA_SLOT_LOOP_MAX_BYTES;
 
-// The engine keeps at most one descriptor per filter type (4). A stored count above this is not
-// a file the library wrote: the reader and the queries refuse such a file instead of looping
-// over billions of records.
+// The set reader's bound on a stored filter count: each descriptor is an allocation and each
+// enabled filter runs over every payload, so a count of billions would allocate and work without
+// bound. A file above it is refused. (The queries only read descriptors and follow any count.)
 constexpr int32_t kMaxStoredFilters = 64;
 
 // Sizes of the records in a source-set file.
@@ -36,6 +36,24 @@ constexpr int kFltDscBytes = 40;
 constexpr int kTuneSetBytes = 88;
 constexpr int kSrcInfoBytes = 20;
 constexpr int kSrcRecordBytes = 48;
+
+// Offsets of the fields of a stored source record: the image of KOVA_SRC on a 64-bit target
+// (three 8-byte reference words, then six 32-bit fields). Fixed numbers rather than offsetof, so
+// a 32-bit build reads and writes the same files.
+constexpr size_t kSrcSizeAt = 24;
+constexpr size_t kSrcPosAt = 28;
+constexpr size_t kSrcSlotAt = 32;
+constexpr size_t kSrcOriginAt = 36;
+constexpr size_t kSrcRptStartAt = 40;
+constexpr size_t kSrcRptEndAt = 44;
+#if UINTPTR_MAX > 0xFFFFFFFFu
+static_assert(offsetof(KOVA_SRC, size) == kSrcSizeAt && offsetof(KOVA_SRC, pos) == kSrcPosAt &&
+                  offsetof(KOVA_SRC, slot) == kSrcSlotAt &&
+                  offsetof(KOVA_SRC, origin) == kSrcOriginAt &&
+                  offsetof(KOVA_SRC, rpt_start) == kSrcRptStartAt &&
+                  offsetof(KOVA_SRC, rpt_end) == kSrcRptEndAt,
+              "a 64-bit KOVA_SRC is the stored record's image");
+#endif
 
 // Reads a field of a stored record image at its byte offset.
 template <typename T>

@@ -1,17 +1,19 @@
 // Writing a whole source set to a file and reading it back.
 //
 // A source-set file comes from outside and may be truncated, corrupted or hostile. The reader
-// trusts none of its values:
+// reads it as its layout says, and is stricter only where the plain reading would be unsafe
+// (docs/reliability.md lists each case and why):
 //  - a filter count above kMaxStoredFilters refuses the file (-3) before the set is touched; a
 //    negative count means no filters;
-//  - descriptors cut by the end of the file, of a type of 4 or more, or for other than 1 or 2
-//    channels are dropped;
-//  - a tune set cut short keeps zeros where the file ends;
-//  - a source record cut short, or with a stored size of 0 or less, leaves its slot empty;
-//    a payload above the slot's limit (38400/192000/38400 bytes) is cut there and the rest
-//    skipped; a payload cut by the end of the file is kept as far as it was read;
-//  - the stored slot is replaced by the record's position, repeat points are kept within the
-//    payload, the play position is 0 and the reference words are never used.
+//  - a descriptor read in part is appended with zeros where the file ended (it is cleared
+//    first); descriptors of a type of 4 or more, or for more than kMaxStoredChannels channels,
+//    are dropped;
+//  - a tune set cut short keeps what the record held before where the file ends;
+//  - a source record read in part is used (cleared first); a stored size below 0 leaves the
+//    slot empty; a payload above the slot's limit (38400/192000/38400 bytes) is cut there and
+//    the rest skipped; a payload cut by the end of the file is kept as far as it was read;
+//  - repeat points are kept within the payload, the play position is 0 and the reference words
+//    are never used; the stored slot field keeps its value (nothing indexes by it).
 //
 // kova_open_source results:
 //   0  the set is filled;
@@ -37,8 +39,8 @@ using namespace kova_source;
 
 namespace kova_source {
 
-// Every stored value is distrusted: the reference words are never used, the payload is bounded
-// by `max_bytes`, and the repeat points are kept within the payload actually held.
+// The reference words are never used, the payload is bounded by `max_bytes` and by what the
+// file holds, and the repeat points are kept within the payload actually held.
 KOVA_SRC* read_src_record(void* h, TARQ_MFAL* mfal, int32_t max_bytes, SrcReadStatus* status) {
     *status = SrcReadStatus::kUnusable;
     if (h == nullptr || mfal == nullptr || max_bytes < 1) return nullptr;
@@ -54,26 +56,24 @@ KOVA_SRC* read_src_record(void* h, TARQ_MFAL* mfal, int32_t max_bytes, SrcReadSt
         return nullptr;
     };
 
+    // A record read in part is used: the fields the file did not reach stay 0.
     unsigned char image[kSrcRecordBytes] = {};
-    // A record cut by the end of the file has no trustworthy size: it is not used.
-    if (mfal->read(h, image, kSrcRecordBytes) != kSrcRecordBytes) {
-        return drop(SrcReadStatus::kUnusable);
-    }
-    const auto stored_size = load<int32_t>(image, offsetof(KOVA_SRC, size));
-    src->pos = load<int32_t>(image, offsetof(KOVA_SRC, pos));
-    src->slot = load<int32_t>(image, offsetof(KOVA_SRC, slot));
+    if (mfal->read(h, image, kSrcRecordBytes) < 1) return drop(SrcReadStatus::kUnusable);
+    const auto stored_size = load<int32_t>(image, kSrcSizeAt);
+    src->pos = load<int32_t>(image, kSrcPosAt);
+    src->slot = load<int32_t>(image, kSrcSlotAt);
     src->origin = KOVA_ORIGIN_SAVEFILE;
-    // A payload of 0 or fewer bytes is no sound; with a negative size the next record cannot
-    // be located either, so such a record is simply not used.
-    if (stored_size <= 0) return drop(SrcReadStatus::kUnusable);
+    // No buffer has a negative size: such a record is not used.
+    if (stored_size < 0) return drop(SrcReadStatus::kUnusable);
 
     // An oversized payload is cut at the limit, like an over-long PCM file; the rest is skipped
-    // so the next record is still found where the writer put it.
+    // so the next record is still found where the writer put it. Buffers get at least one byte
+    // so that an empty payload is not mistaken for memory running out.
     const int32_t keep = std::min(stored_size, max_bytes);
-    src->pcm = static_cast<int16_t*>(kova_mem_malloc(static_cast<size_t>(keep)));
+    src->pcm = static_cast<int16_t*>(kova_mem_malloc(static_cast<size_t>(std::max(keep, 1))));
     if (src->pcm == nullptr) return drop(SrcReadStatus::kNoMemory);
-    const int got = mfal->read(h, src->pcm, keep);
-    if (got <= 0) return drop(SrcReadStatus::kUnusable);
+    const int read = keep > 0 ? mfal->read(h, src->pcm, keep) : 0;
+    const int got = read > 0 ? read : 0;
     if (got == keep && stored_size > keep) {
         const int64_t rest = static_cast<int64_t>(stored_size) - keep;
         mfal->skip(h, &rest);
@@ -82,13 +82,13 @@ KOVA_SRC* read_src_record(void* h, TARQ_MFAL* mfal, int32_t max_bytes, SrcReadSt
     // beyond `got` were never written and are not part of the source.
     src->size = got;
 
-    src->pcm_proc = static_cast<int16_t*>(kova_mem_malloc(static_cast<size_t>(got)));
+    src->pcm_proc = static_cast<int16_t*>(kova_mem_malloc(static_cast<size_t>(std::max(got, 1))));
     if (src->pcm_proc == nullptr) return drop(SrcReadStatus::kNoMemory);
-    std::memcpy(src->pcm_proc, src->pcm, static_cast<size_t>(got));
+    if (got > 0) std::memcpy(src->pcm_proc, src->pcm, static_cast<size_t>(got));
 
     // Playback trusts the repeat points to lie within the samples.
-    src->rpt_start = std::clamp(load<int32_t>(image, offsetof(KOVA_SRC, rpt_start)), 0, got);
-    src->rpt_end = std::clamp(load<int32_t>(image, offsetof(KOVA_SRC, rpt_end)), 0, got);
+    src->rpt_start = std::clamp(load<int32_t>(image, kSrcRptStartAt), 0, got);
+    src->rpt_end = std::clamp(load<int32_t>(image, kSrcRptEndAt), 0, got);
     *status = SrcReadStatus::kOk;
     return src;
 }
@@ -150,16 +150,16 @@ KOVA_API int kova_open_source(KOVA_SRCSET* set, const char* path) {
     TARQ_MFAL* m = file.mfal();
 
     int32_t count = 0;
-    if (_read_flt_size(h, m, &count) != kCountBytes) count = 0;
+    // A count read in part keeps zero high bytes.
+    if (_read_flt_size(h, m, &count) < 1) count = 0;
     if (count > kMaxStoredFilters) return KOVA_ERR_INVALID_PARAM;  // checked before any change
 
     for (int32_t i = 0; i < count; ++i) {
         auto* dsc = static_cast<KOVA_FLT_DSC*>(kova_mem_calloc(1, sizeof(KOVA_FLT_DSC)));
         if (dsc == nullptr) return KOVA_ERR_INSUFF_MEM;
-        // Only whole, usable descriptors are kept: a record cut by the end of the file would
-        // carry zeros for its missing fields.
-        if (_read_KOVA_FLT_DSC(h, m, dsc) != kFltDscBytes ||
-            !filter_dsc_ok(dsc, FilterUse::kStored)) {
+        // A descriptor read in part keeps zeros where the file ended; one that is not usable
+        // (source/filter_dsc.h) is dropped.
+        if (_read_KOVA_FLT_DSC(h, m, dsc) < 1 || !filter_dsc_ok(dsc, FilterUse::kStored)) {
             kova_mem_free(dsc);
             continue;
         }
@@ -169,11 +169,9 @@ KOVA_API int kova_open_source(KOVA_SRCSET* set, const char* path) {
         }
     }
 
-    // The record given in is overwritten whole: the engine hands over an unfilled one, so bytes
-    // a short file does not hold are cleared instead of left as whatever the heap held.
-    KOVA_TUNE_SET stored_tune{};
-    _read_KOVA_TUNE_SET(h, m, &stored_tune);
-    *set->tune = stored_tune;
+    // Read over the record given in: where the file ends, it keeps what it held (the engine
+    // hands over a cleared one).
+    _read_KOVA_TUNE_SET(h, m, set->tune);
     // Every source read back counts as a file source, which plays at file_gain: a set saved
     // with noise keeps its level through wn_gain.
     KOVA_TUNE_SET* tune = set->tune;
@@ -190,7 +188,6 @@ KOVA_API int kova_open_source(KOVA_SRCSET* set, const char* path) {
         KOVA_SRC* src = read_src_record(h, m, slot_max_bytes(slot), &status);
         if (status == SrcReadStatus::kNoMemory) return KOVA_ERR_INSUFF_MEM;
         if (src == nullptr) continue;  // unreadable record: the slot stays empty
-        src->slot = slot;              // the position in the file decides the slot
         src->pos = 0;
         kova_proc_filters(src->pcm_proc, static_cast<uint32_t>(src->size), set->filters);
         set->src[slot] = src;

@@ -91,12 +91,12 @@ KOVA_API int _write_KOVA_SRC(void* h, TARQ_MFAL* mfal, const KOVA_SRC* src) {
     if (!usable(h, mfal) || src == nullptr) return -1;
     // The three reference words stay 0: addresses mean nothing in a file.
     unsigned char image[kSrcRecordBytes] = {};
-    put(image, offsetof(KOVA_SRC, size), src->size);
-    put(image, offsetof(KOVA_SRC, pos), src->pos);
-    put(image, offsetof(KOVA_SRC, slot), src->slot);
-    put(image, offsetof(KOVA_SRC, origin), src->origin);
-    put(image, offsetof(KOVA_SRC, rpt_start), src->rpt_start);
-    put(image, offsetof(KOVA_SRC, rpt_end), src->rpt_end);
+    put(image, kSrcSizeAt, src->size);
+    put(image, kSrcPosAt, src->pos);
+    put(image, kSrcSlotAt, src->slot);
+    put(image, kSrcOriginAt, src->origin);
+    put(image, kSrcRptStartAt, src->rpt_start);
+    put(image, kSrcRptEndAt, src->rpt_end);
     const int head = mfal->write(h, image, kSrcRecordBytes);
     int body = 0;
     if (src->size > 0) {

@@ -1,7 +1,13 @@
 // Registration by files, filter and saved file: identifiers, limits, defaults, failure paths.
+#include <fcntl.h>
 #include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <unistd.h>
 
+#include <atomic>
+#include <chrono>
 #include <string>
+#include <thread>
 #include <vector>
 
 #include "engine/engine_fixture.h"
@@ -15,7 +21,97 @@ using kova_test::tune_values;
 
 const KOVA_FLT_DSC kLowpass{KOVA_FLT_LOWPASS, 2000.0, 0.0, 1, 48000, 2};
 
+/* Runs `call` on a thread and reports whether it returned within 5 s. A call that blocks in open
+ * on `fifo` is then set free by opening the other end, so a regression fails instead of hanging. */
+template <typename Call>
+bool returns_promptly(Call call, const std::string& fifo) {
+    std::atomic<bool> done{false};
+    std::thread worker([&] {
+        call();
+        done = true;
+    });
+    const auto give_up = std::chrono::steady_clock::now() + std::chrono::seconds(5);
+    while (!done && std::chrono::steady_clock::now() < give_up) {
+        std::this_thread::sleep_for(std::chrono::milliseconds(1));
+    }
+    const bool prompt = done;
+    while (!done) {
+        const int fd = open(fifo.c_str(), O_WRONLY | O_NONBLOCK);
+        if (fd >= 0) close(fd);
+        std::this_thread::sleep_for(std::chrono::milliseconds(1));
+    }
+    worker.join();
+    return prompt;
+}
+
 }  // namespace
+
+/* A FIFO, a directory and a device are no sound files: every path-taking call refuses them at
+ * once with the code it gives for a missing file, and the context keeps its set. */
+TEST(Registration, NonRegularFilesAreRefusedWithoutBlocking) {
+    kova_test::TempDir dir;
+    const std::string fifo = dir.file("fifo"), missing = dir.file("none");
+    ASSERT_EQ(mkfifo(fifo.c_str(), 0600), 0);
+    auto e = kova_test::make_ctx();
+    const std::string loop = dir.write("l.pcm", kova_test::varied(4000));
+    const char* good[3] = {nullptr, loop.c_str(), nullptr};
+    int32_t err = 0;
+    ASSERT_EQ(kova_reg_src_byfiles(e.get(), good, &err), 1);
+
+    // Results, in order, of every call on `path`.
+    auto results = [&](const std::string& path) {
+        const char* p = path.c_str();
+        const char* as_loop[3] = {loop.c_str(), p, nullptr};
+        const char* as_start[3] = {p, loop.c_str(), nullptr};
+        std::vector<int64_t> r;
+        int32_t code = 1;
+        int load_code = 1;
+        r.push_back(kova_reg_src_byfiles(e.get(), as_loop, &code));
+        r.push_back(code);
+        r.push_back(kova_reg_src_bysavefile(e.get(), p, &code));
+        r.push_back(code);
+        r.push_back(kova_update_src_byfiles(e.get(), 1, as_start, &code));
+        r.push_back(code);
+        KOVA_SRC* src = kova_load_sound_source(p, KOVA_SLOT_LOOP, &load_code);
+        r.push_back(src != nullptr);
+        kova_free_sourceobj(src);
+        r.push_back(load_code);
+        char buf[64];
+        r.push_back(kova_read_source_file(p, buf, sizeof buf));
+        int off[6] = {0};
+        KOVA_FLT_DSC flt[KOVA_FLT_TYPE_COUNT] = {};
+        KOVA_TUNE_SET tune{};
+        KOVA_RPT_INFO info{};
+        testing::internal::CaptureStdout();
+        r.push_back(
+            kova_get_pcminfo_fromfile(p, &off[0], &off[1], &off[2], &off[3], &off[4], &off[5]));
+        r.push_back(kova_get_filters_fromfile(p, flt));
+        r.push_back(kova_get_tuneset_fromfile(p, &tune));
+        r.push_back(kova_get_rptinfo_fromfile(p, &info));
+        testing::internal::GetCapturedStdout();
+        if (path != missing) r.push_back(kova_save_source(e.get(), 1, p));
+        return r;
+    };
+    std::vector<int64_t> expected = results(missing);
+    expected.push_back(KOVA_ERR_SOURCE);  // saving
+    EXPECT_EQ(expected[1], KOVA_ERR_SOURCE);
+    EXPECT_EQ(expected[7], KOVA_ERR_SOURCE);
+    EXPECT_EQ(expected[9], KOVA_ERR_INVALID_PARAM);
+
+    for (const std::string& path : {fifo, dir.path, std::string("/dev/zero")}) {
+        std::vector<int64_t> got;
+        EXPECT_TRUE(returns_promptly([&] { got = results(path); }, fifo)) << path;
+        EXPECT_EQ(got, expected) << path;
+    }
+    EXPECT_EQ(kova_get_src_num(e.get()), 1);
+    EXPECT_EQ(e.get()->active_src, 1);
+    const KOVA_SRCSET* set = set_of(e.get(), 1);
+    EXPECT_EQ(set->src[KOVA_SLOT_START], nullptr);
+    EXPECT_EQ(set->src[KOVA_SLOT_LOOP]->size, 8000);
+    struct stat st {};
+    ASSERT_EQ(stat(fifo.c_str(), &st), 0);
+    EXPECT_TRUE(S_ISFIFO(st.st_mode));
+}
 
 TEST(Registration, LoopPathDecidesWhetherASetExists) {
     kova_test::TempDir dir;

@@ -120,4 +120,27 @@ TEST(FastTrackDevice, DeviceReceivesExactlyTheWrittenBlocksAcrossUnderruns) {
     EXPECT_EQ(kova_host_capture_size(), 0u);
 }
 
+/* A device that stopped draining: closing the stream returns after a short, bounded wait, the
+ * callback is never called again (the handle is freed by then; AddressSanitizer would see it),
+ * and the held-up thread ends on its own once its write returns. */
+TEST(FastTrackDevice, CloseDuringAStalledWriteIsBounded) {
+    kova_host_use_stall_sink(1500);
+    kova_host_reset_counters();
+    KOVA_FASTTRACK* ft = kova_open_fasttrack(kRate, kChannels);
+    kova_host_use_null_sink();
+    ASSERT_NE(ft, nullptr);
+    kova_start_fasttrack(ft);
+    ASSERT_TRUE(wait_for([] { return kova_host_callbacks() >= 1; }));  // now in its 1.5 s write
+    const unsigned long callbacks = kova_host_callbacks();
+
+    const auto t0 = std::chrono::steady_clock::now();
+    kova_stop_fasttrack(ft);
+    kova_close_fasttrack(ft, 1);
+    EXPECT_LT(std::chrono::steady_clock::now() - t0, 600ms);
+    EXPECT_EQ(kova_host_lingering_tracks(), 1u);
+
+    ASSERT_TRUE(wait_for([] { return kova_host_lingering_tracks() == 0; }));
+    EXPECT_EQ(kova_host_callbacks(), callbacks);
+}
+
 }  // namespace

@@ -7,6 +7,7 @@
 #include <thread>
 
 #include "jni/jni_test_support.h"
+#include "kova_host/audio_sink.h"
 
 namespace {
 
@@ -114,6 +115,40 @@ TEST_F(Locking, DeinitDestroyingTheLockStrandsNoCaller) {
     EXPECT_EQ(gpKovaMutex, nullptr);  // the last deinit destroyed it
     EXPECT_EQ(init_default(), 1);
     EXPECT_NE(gpKovaMutex, nullptr);
+}
+
+/* An instance whose device has stalled (each burst takes 2.5 s to write) is torn down while
+ * another instance keeps calling: deinit holds the registry lock only for its bounded release of
+ * the device, so the other instance's call gets through well before the stalled write ends. */
+TEST_F(Locking, DeinitOfAStalledInstanceDoesNotHoldUpOthers) {
+    using namespace std::chrono_literals;
+    kova_host_use_stall_sink(2500);
+    const jlong stalled = init_default();
+    kova_host_use_null_sink();
+    const jlong other = init_default();
+    ASSERT_EQ(stalled, 1);
+    ASSERT_EQ(other, 2);
+    Java_com_corvane_audio_Kova_start_1fasttrack(env(), nullptr, stalled);
+    std::this_thread::sleep_for(50ms);  // the device thread is now inside its first write
+
+    std::atomic<bool> torn_down{false};
+    std::thread owner([&] {
+        EXPECT_EQ(deinit(stalled), 0);
+        torn_down = true;
+    });
+    std::this_thread::sleep_for(20ms);  // let deinit take the registry lock
+    const auto t0 = std::chrono::steady_clock::now();
+    EXPECT_EQ(Java_com_corvane_audio_Kova_get_1src_1num(env(), nullptr, other), 0);
+    EXPECT_LT(std::chrono::steady_clock::now() - t0, 1500ms);
+    owner.join();
+    EXPECT_TRUE(torn_down);
+    EXPECT_EQ(deinit(other), 0);
+
+    const auto give_up = std::chrono::steady_clock::now() + 10s;
+    while (kova_host_lingering_tracks() != 0 && std::chrono::steady_clock::now() < give_up) {
+        std::this_thread::sleep_for(10ms);
+    }
+    EXPECT_EQ(kova_host_lingering_tracks(), 0u);
 }
 
 }  // namespace

@@ -7,7 +7,8 @@
 //     and byte count per instance, compared whenever the stream was drained);
 //   - no underrun while the producer keeps up: during a stroke whose events all came within
 //     kKeepUpMs of each other, the stream never held less than one device burst;
-//   - no block was refused for lack of room;
+//   - no block was refused for lack of room (the stream kept room for the largest block, and
+//     blocks that kova_write_fasttrack actually refused are counted and reported as drops);
 //   - memory stays flat: the library allocates only while registering (allocation counter), and
 //     the process's resident size grows by no more than the registered sources can explain
 //     (plain builds; sanitizers keep their own books).
@@ -137,6 +138,7 @@ struct Result {
     uint64_t strokes_checked = 0;  // strokes in which the producer kept up
     uint64_t thin_moments = 0;     // stream below one burst while the producer kept up
     uint64_t refused_room = 0;     // a block that could not have fitted
+    uint64_t dropped = 0;          // blocks the stream refused (not stored, never played)
     uint64_t drains = 0;
     uint64_t mismatches = 0;  // device content differed from the generated blocks
     uint64_t registrations = 0;
@@ -197,6 +199,13 @@ class Producer {
         pthread_mutex_unlock(ft->pMutex);
         return n;
     }
+    uint32_t ring_write_index() {
+        KOVA_FASTTRACK* ft = inst_->pFastTrack;
+        pthread_mutex_lock(ft->pMutex);
+        const uint32_t n = ft->pRing->writeIdx;
+        pthread_mutex_unlock(ft->pMutex);
+        return n;
+    }
     uint32_t ring_write_space() {
         KOVA_FASTTRACK* ft = inst_->pFastTrack;
         pthread_mutex_lock(ft->pMutex);
@@ -211,9 +220,17 @@ class Producer {
         // The stream only ever gains room while the producer is away, so room seen now is room
         // at the write.
         if (ring_write_space() < kStartBytes + kEndBytes) ++result_.refused_room;
+        // Only this thread writes, so the write index moves exactly when the block was stored;
+        // a block the stream refused (the call still returns its length) is a drop, and the
+        // device must not expect it.
+        const uint32_t write_before = ring_write_index();
         const jint n = Java_com_corvane_audio_Kova_gen_1tofasttrack(fake_jni::env(), nullptr, id_,
                                                                     x, y, now_ms(), 0.0f, action);
         ASSERT_GE(n, 0);
+        if (n > 0 && ring_write_index() == write_before) {
+            ++result_.dropped;
+            return;
+        }
         written_.add(inst_->pcm.data, static_cast<size_t>(n));
         result_.bytes += static_cast<uint64_t>(n);
         ++result_.events;
@@ -347,12 +364,14 @@ TEST(Soak, InstancesStreamStrokesWithoutLossUnderrunOrGrowth) {
         EXPECT_EQ(r.mismatches, 0u) << "device content differs from the generated blocks";
         EXPECT_EQ(r.thin_moments, 0u) << "stream ran dry while the producer kept up";
         EXPECT_EQ(r.refused_room, 0u) << "stream had no room for a block";
+        EXPECT_EQ(r.dropped, 0u) << "stream refused blocks";
         EXPECT_GT(r.strokes, 0u);
         EXPECT_GT(r.bytes, 0u);
         total.events += r.events;
         total.strokes += r.strokes;
         total.strokes_checked += r.strokes_checked;
         total.drains += r.drains;
+        total.dropped += r.dropped;
         total.registrations += r.registrations;
         total.bytes += r.bytes;
     }
@@ -375,12 +394,12 @@ TEST(Soak, InstancesStreamStrokesWithoutLossUnderrunOrGrowth) {
     std::printf(
         "soak: %d s, %d instances, %llu events, %llu strokes (%llu with the producer "
         "keeping up), %llu registrations, %llu drains, %.1f MB streamed, resident "
-        "%+ld KB, host underruns %lu of %lu bursts, %llu silent bursts\n",
+        "%+ld KB, host underruns %lu of %lu bursts, %llu silent bursts, %llu dropped blocks\n",
         soak_seconds(), kInstances, (unsigned long long)total.events,
         (unsigned long long)total.strokes, (unsigned long long)total.strokes_checked,
         (unsigned long long)total.registrations, (unsigned long long)total.drains,
         total.bytes / 1e6, (resident_after - resident_before) / 1024, kova_host_underruns(),
-        kova_host_callbacks(), (unsigned long long)silent);
+        kova_host_callbacks(), (unsigned long long)silent, (unsigned long long)total.dropped);
 }
 
 }  // namespace

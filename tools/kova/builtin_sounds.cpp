@@ -43,15 +43,16 @@ class Noise {
 
 }  // namespace
 
-/* The pen touching down: a 4 ms noise burst over a ringing 2400 Hz + 1200 Hz pair that decays
- * with a 12 ms time constant; peak about 0.9 of full scale. */
+/* The pen touching down: a 4 ms noise burst over a ringing 2500 Hz + 3700 Hz pair that decays
+ * with a 10 ms time constant; peak at full scale. The tones lie inside the built-in set's band,
+ * which filters the start sound too, so the tick keeps its level there. */
 std::vector<int16_t> builtin_start_sound(uint32_t rate, uint32_t channels, uint32_t max_bytes) {
     Noise noise;
     return render(rate, channels, max_bytes, kBuiltinStartMs, [&](double t) {
         const double ring =
-            0.7 * std::sin(kTwoPi * 2400.0 * t) + 0.3 * std::sin(kTwoPi * 1200.0 * t);
-        const double burst = t < 0.004 ? 0.5 * noise.next() * (1.0 - t / 0.004) : 0.0;
-        return 0.9 * (std::exp(-t / 0.012) * ring + burst);
+            0.8 * std::sin(kTwoPi * 2500.0 * t) + 0.2 * std::sin(kTwoPi * 3700.0 * t);
+        const double burst = t < 0.004 ? 0.3 * noise.next() * (1.0 - t / 0.004) : 0.0;
+        return std::exp(-t / 0.010) * ring + burst;
     });
 }
 

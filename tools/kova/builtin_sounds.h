@@ -8,7 +8,7 @@
 namespace kova_tool {
 
 /* Lengths of the two sounds (shorter only where a slot's byte limit cuts them). */
-constexpr int kBuiltinStartMs = 80;
+constexpr int kBuiltinStartMs = 40;
 constexpr int kBuiltinEndMs = 120;
 
 /* Interleaved 16-bit samples of the start "tick" or the end "lift-off" for the given format,

@@ -11,6 +11,9 @@ namespace kova_tool {
 namespace {
 
 std::FILE* g_out = stdout;
+std::FILE* g_info = stdout;
+std::FILE* g_null = nullptr;
+bool g_quiet = false;
 int g_saved_stdout = -1;
 
 }  // namespace
@@ -27,6 +30,28 @@ std::FILE* out() {
     return g_out;
 }
 
+std::FILE* info() {
+    if (!g_quiet) return g_info;
+    if (!g_null) g_null = std::fopen("/dev/null", "w");
+    return g_null ? g_null : stderr;
+}
+
+void set_quiet(bool quiet) {
+    g_quiet = quiet;
+}
+
+bool quiet() {
+    return g_quiet;
+}
+
+void data_on_stdout() {
+    g_info = stderr;
+}
+
+void note(const std::string& text) {
+    if (!g_quiet) std::fprintf(stderr, "kova: note: %s\n", text.c_str());
+}
+
 void init_output() {
     // The tool writes through a duplicate of the original standard output, so descriptor 1 can be
     // pointed at /dev/null while library calls run.
@@ -34,7 +59,7 @@ void init_output() {
     g_saved_stdout = dup(STDOUT_FILENO);
     if (g_saved_stdout < 0) return;
     std::FILE* f = fdopen(g_saved_stdout, "w");
-    if (f) g_out = f;
+    if (f) g_out = g_info = f;
     set_library_chatter(false);
 }
 
@@ -46,42 +71,13 @@ void set_library_chatter(bool verbose) {
         return;
     }
     int null_fd = open("/dev/null", O_WRONLY | O_CLOEXEC);
-    if (null_fd >= 0 && g_saved_stdout >= 0) {
-        dup2(null_fd, STDOUT_FILENO);
-    }
+    if (null_fd >= 0 && g_saved_stdout >= 0) dup2(null_fd, STDOUT_FILENO);
     if (null_fd >= 0) close(null_fd);
     // The output stream logs at debug level; a person running the tool wants warnings only.
     __android_log_set_minimum_priority(ANDROID_LOG_WARN);
 }
 
-Args::Args(int argc, char** argv, int first) {
-    for (int i = first; i < argc; ++i) args_.emplace_back(argv[i]);
-}
-
-std::string_view Args::next() {
-    inline_value_ = nullptr;
-    current_ = args_[pos_++];
-    if (current_.rfind("--", 0) == 0) {
-        const size_t eq = current_.find('=');
-        if (eq != std::string::npos) {
-            inline_storage_ = current_.substr(eq + 1);
-            inline_value_ = &inline_storage_;
-            current_.resize(eq);
-        }
-    }
-    return current_;
-}
-
-std::string Args::value(std::string_view option) {
-    if (inline_value_) {
-        inline_value_ = nullptr;
-        return inline_storage_;
-    }
-    if (done()) usage_error(std::string(option) + " needs a value");
-    return args_[pos_++];
-}
-
-std::string quoted(std::string_view text) {
+std::string in_quotes(std::string_view text) {
     return "'" + std::string(text) + "'";
 }
 

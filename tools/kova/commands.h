@@ -1,17 +1,21 @@
-/* The subcommands of the kova tool. Each reads its own options from `args` and returns the exit
- * code; failures are thrown as ToolError. */
+/* The subcommands of the kova tool. Each adds itself to the command line and returns what runs
+ * it with the parsed options; failures are thrown as ToolError. */
 #ifndef KOVA_TOOL_COMMANDS_H
 #define KOVA_TOOL_COMMANDS_H
 
-#include "cli.h"
+#include <CLI/CLI.hpp>
+#include <functional>
 
 namespace kova_tool {
 
-int run_render(Args& args);
-int run_play(Args& args);
-int run_save(Args& args);
-int run_inspect(Args& args);
-int run_gesture(Args& args);
+/* Returns the exit code. */
+using Run = std::function<int()>;
+
+Run add_render(CLI::App& app);
+Run add_play(CLI::App& app);
+Run add_save(CLI::App& app);
+Run add_inspect(CLI::App& app);
+Run add_gesture(CLI::App& app);
 
 /* The engine's output buffer for one event, as large as the Java binding's PCM buffer. */
 constexpr int32_t kBlockBytes = 960000;

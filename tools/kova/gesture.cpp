@@ -7,14 +7,18 @@
 #include <cmath>
 #include <cstdlib>
 #include <cstring>
-#include <fstream>
+#include <sstream>
 #include <functional>
 #include <numbers>
+
+#include "input_file.h"
 
 namespace kova_tool {
 namespace {
 
 constexpr size_t kMaxEvents = 1000000;
+/* A million events of about 30 bytes each, with room for comments. */
+constexpr int64_t kMaxCsvBytes = 64LL << 20;
 constexpr int64_t kMaxTimeMs = 24LL * 3600 * 1000;
 
 struct Point {
@@ -22,42 +26,22 @@ struct Point {
     double y;
 };
 
-std::string trim(const std::string& s) {
-    const size_t a = s.find_first_not_of(" \t\r");
-    if (a == std::string::npos) return "";
-    const size_t b = s.find_last_not_of(" \t\r");
-    return s.substr(a, b - a + 1);
-}
-
+/* The cells of one CSV line, trimmed. */
 std::vector<std::string> split(const std::string& line) {
-    std::vector<std::string> cells;
-    size_t from = 0;
-    for (;;) {
-        const size_t comma = line.find(',', from);
-        cells.push_back(trim(line.substr(from, comma - from)));
-        if (comma == std::string::npos) break;
-        from = comma + 1;
-    }
+    std::vector<std::string> cells = CLI::detail::split(line, ',');
+    for (std::string& c : cells) CLI::detail::trim(c);
     return cells;
 }
 
-std::string lower(std::string s) {
-    for (char& c : s) c = static_cast<char>(std::tolower(static_cast<unsigned char>(c)));
-    return s;
-}
-
 bool parse_action(const std::string& text, uint32_t& action) {
-    const std::string a = lower(text);
-    if (a == "down" || a == "start" || a == "0") {
-        action = KOVA_ACTION_START;
-    } else if (a == "move" || a == "1") {
-        action = KOVA_ACTION_MOVE;
-    } else if (a == "up" || a == "end" || a == "2") {
-        action = KOVA_ACTION_END;
-    } else {
-        return false;
+    static const std::pair<const char*, uint32_t> names[] = {
+        {"down", KOVA_ACTION_START}, {"start", KOVA_ACTION_START}, {"0", KOVA_ACTION_START},
+        {"move", KOVA_ACTION_MOVE},  {"1", KOVA_ACTION_MOVE},      {"up", KOVA_ACTION_END},
+        {"end", KOVA_ACTION_END},    {"2", KOVA_ACTION_END}};
+    for (const auto& [name, code] : names) {
+        if (CLI::detail::to_lower(text) == name) return action = code, true;
     }
-    return true;
+    return false;
 }
 
 bool parse_number(const std::string& text, double& v) {
@@ -95,83 +79,56 @@ double ease(double s, double swing) {
     return s - swing * std::sin(2.0 * std::numbers::pi * s) / (2.0 * std::numbers::pi);
 }
 
-/* About 0.4 to 0.7 px/ms down the screen: a slow scroll. Every 8 ms step stays above the 3 px the
- * engine needs to count a move. */
-void slow_stroke(std::vector<TouchEvent>& ev, int64_t t0, int64_t ms, uint32_t hz, double cx,
-                 double cy, uint32_t w, uint32_t h) {
-    append_stroke(
-        ev, t0, ms, hz,
-        [&](double s) {
-            const double u = ease(s, 0.25);
-            return Point{cx - 60.0 + 120.0 * u + 40.0 * std::sin(2.0 * std::numbers::pi * u),
-                         cy - 450.0 + 900.0 * u};
-        },
-        w, h);
-}
-
-/* A flick of about 1400 px in 300 ms: from rest up to about 9 px/ms and back. */
-void fast_stroke(std::vector<TouchEvent>& ev, int64_t t0, uint32_t hz, double cx, double cy,
-                 uint32_t w, uint32_t h) {
-    append_stroke(
-        ev, t0, 300, hz,
-        [&](double s) {
-            const double u = ease(s, 0.8);
-            return Point{cx - 300.0 + 600.0 * u, cy + 600.0 - 1300.0 * u};
-        },
-        w, h);
-}
-
-/* A sweep of about 1.4 px/ms to the right along an arc. */
-void medium_stroke(std::vector<TouchEvent>& ev, int64_t t0, uint32_t hz, double cx, double cy,
-                   uint32_t w, uint32_t h) {
-    append_stroke(
-        ev, t0, 600, hz,
-        [&](double s) {
-            const double u = ease(s, 0.5);
-            return Point{cx - 400.0 + 800.0 * u,
-                         cy + 200.0 - 300.0 * std::sin(std::numbers::pi * u)};
-        },
-        w, h);
-}
-
 }  // namespace
 
-const char* const kBuiltinGestureNames = "slow, fast, strokes";
-
 const char* action_name(uint32_t action) {
-    switch (action) {
-        case KOVA_ACTION_START:
-            return "down";
-        case KOVA_ACTION_MOVE:
-            return "move";
-        case KOVA_ACTION_END:
-            return "up";
-        default:
-            return "?";
-    }
+    static const char* const names[] = {"down", "move", "up"};
+    return action <= KOVA_ACTION_END ? names[action] : "?";
 }
 
 std::vector<TouchEvent> builtin_gesture(const std::string& name, uint32_t hz, uint32_t w,
                                         uint32_t h) {
     std::vector<TouchEvent> ev;
-    const double cx = w / 2.0;
-    const double cy = h / 2.0;
+    const double cx = w / 2.0, cy = h / 2.0, pi = std::numbers::pi;
+    const auto stroke = [&](int64_t t0, int64_t ms, double swing, auto path) {
+        append_stroke(
+            ev, t0, ms, hz, [&](double s) { return path(ease(s, swing)); }, w, h);
+    };
+    // About 0.4 to 0.7 px/ms down the screen: a slow scroll. Every 8 ms step stays above the 3 px
+    // the engine needs to count a move.
+    const auto slow = [&](int64_t t0, int64_t ms) {
+        stroke(t0, ms, 0.25, [&](double u) {
+            return Point{cx - 60.0 + 120.0 * u + 40.0 * std::sin(2.0 * pi * u),
+                         cy - 450.0 + 900.0 * u};
+        });
+    };
+    // A flick of about 1400 px in 300 ms: from rest up to about 9 px/ms and back.
+    const auto fast = [&](int64_t t0) {
+        stroke(t0, 300, 0.8, [&](double u) {
+            return Point{cx - 300.0 + 600.0 * u, cy + 600.0 - 1300.0 * u};
+        });
+    };
     if (name == "slow") {
-        slow_stroke(ev, 0, 1600, hz, cx, cy, w, h);
+        slow(0, 1600);
     } else if (name == "fast") {
-        fast_stroke(ev, 0, hz, cx, cy, w, h);
+        fast(0);
     } else if (name == "strokes") {
-        // Three strokes with pauses between them: a sweep, a flick, a slow scroll.
-        medium_stroke(ev, 0, hz, cx, cy, w, h);
-        fast_stroke(ev, ev.back().time_ms + 500, hz, cx, cy, w, h);
-        slow_stroke(ev, ev.back().time_ms + 600, 1000, hz, cx, cy, w, h);
+        // Three strokes with pauses between them: a sweep of about 1.4 px/ms to the right along an
+        // arc, a flick, a slow scroll.
+        stroke(0, 600, 0.5, [&](double u) {
+            return Point{cx - 400.0 + 800.0 * u, cy + 200.0 - 300.0 * std::sin(pi * u)};
+        });
+        fast(ev.back().time_ms + 500);
+        slow(ev.back().time_ms + 600, 1000);
     }
     return ev;
 }
 
 std::vector<TouchEvent> read_gesture_csv(const std::string& path) {
-    std::ifstream in(path);
-    if (!in) failure("cannot open gesture file " + quoted(path) + ": " + std::strerror(errno));
+    std::string text = InputFile(path, "gesture file").read_all(kMaxCsvBytes);
+    // Spreadsheet programs save UTF-8 with a byte-order mark.
+    if (text.rfind("\xEF\xBB\xBF", 0) == 0) text.erase(0, 3);
+    std::istringstream in(text);
     std::vector<TouchEvent> events;
     std::string line;
     int lineno = 0;
@@ -181,11 +138,11 @@ std::vector<TouchEvent> read_gesture_csv(const std::string& path) {
     };
     while (std::getline(in, line)) {
         ++lineno;
-        const std::string t = trim(line);
+        const std::string t = CLI::detail::trim_copy(line);
         if (t.empty() || t[0] == '#') continue;
         std::vector<std::string> cells = split(t);
         if (!header) {
-            for (std::string& c : cells) c = lower(c);
+            for (std::string& c : cells) c = CLI::detail::to_lower(c);
             const bool ok = cells.size() >= 4 && cells.size() <= 5 && cells[0] == "time_ms" &&
                             cells[1] == "action" && cells[2] == "x" && cells[3] == "y" &&
                             (cells.size() == 4 || cells[4] == "aux");
@@ -200,7 +157,7 @@ std::vector<TouchEvent> read_gesture_csv(const std::string& path) {
         TouchEvent e;
         double v = 0;
         if (!parse_number(cells[0], v) || v != std::floor(v) || v < 0 || v > kMaxTimeMs) {
-            bad("time_ms " + quoted(cells[0]) + " is not a whole number of ms in 0.." +
+            bad("time_ms " + in_quotes(cells[0]) + " is not a whole number of ms in 0.." +
                 std::to_string(kMaxTimeMs));
         }
         e.time_ms = static_cast<int64_t>(v);
@@ -209,13 +166,14 @@ std::vector<TouchEvent> read_gesture_csv(const std::string& path) {
                 std::to_string(events.back().time_ms) + ")");
         }
         if (!parse_action(cells[1], e.action)) {
-            bad("action " + quoted(cells[1]) + " is unknown (accepted: down, move, up or 0, 1, 2)");
+            bad("action " + in_quotes(cells[1]) +
+                " is unknown (accepted: down, move, up or 0, 1, 2)");
         }
         const char* names[] = {"x", "y", "aux"};
         float* fields[] = {&e.x, &e.y, &e.aux};
         for (size_t i = 0; i + 2 < cells.size(); ++i) {
             if (!parse_number(cells[i + 2], v) || (i < 2 && (v < 0 || v > 1e6))) {
-                bad(std::string(names[i]) + " " + quoted(cells[i + 2]) +
+                bad(std::string(names[i]) + " " + in_quotes(cells[i + 2]) +
                     (i < 2 ? " is not a number of pixels in 0..1000000" : " is not a number"));
             }
             *fields[i] = static_cast<float>(v);
@@ -223,7 +181,6 @@ std::vector<TouchEvent> read_gesture_csv(const std::string& path) {
         if (events.size() == kMaxEvents) bad("more than " + std::to_string(kMaxEvents) + " events");
         events.push_back(e);
     }
-    if (in.bad()) failure("cannot read gesture file " + quoted(path) + ": " + std::strerror(errno));
     if (!header) failure(path + ": no header line time_ms,action,x,y[,aux]");
     if (events.empty()) failure(path + ": no events after the header");
     return events;

@@ -29,7 +29,6 @@ void write_gesture_csv(std::FILE* f, const std::vector<TouchEvent>& events);
 /* The built-in gestures, sampled at `touch_hz` on a w x h screen; empty for an unknown name. */
 std::vector<TouchEvent> builtin_gesture(const std::string& name, uint32_t touch_hz, uint32_t w,
                                         uint32_t h);
-extern const char* const kBuiltinGestureNames; /* "slow, fast, strokes" */
 
 /* A built-in gesture by name, or the CSV file of that name. */
 std::vector<TouchEvent> load_gesture(const GestureOptions& opts, uint32_t w, uint32_t h);

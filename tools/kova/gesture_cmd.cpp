@@ -4,61 +4,50 @@
 
 #include <unistd.h>
 
+#include <memory>
+
 namespace kova_tool {
 namespace {
 
-const char* const kHelp =
-    "Usage: kova gesture [NAME] [options]\n"
-    "Prints a built-in gesture (slow, fast or strokes; default strokes) as CSV, the format that\n"
-    "--gesture FILE reads: a starting point for gestures of your own.\n"
-    "\n"
-    "  --touch-rate HZ      event rate, 10..300 (default 120)\n"
-    "  --screen WxH         screen size in pixels (default 1080x2280)\n"
-    "  -o, --output FILE    write to FILE instead of standard output\n";
-
-}  // namespace
-
-int run_gesture(Args& args) {
-    GestureOptions g;
-    SetupOptions setup;
+struct GestureCommand {
+    GestureOptions gesture;
+    FormatOptions format;
     std::string output;
-    bool named = false;
-    while (!args.done()) {
-        const std::string name(args.next());
-        if (name == "--help" || name == "-h") {
-            std::fprintf(out(), "%s", kHelp);
-            return kExitOk;
-        }
-        if (name == "--touch-rate") {
-            parse_gesture_option(name, args, g);
-        } else if (name == "--screen") {
-            parse_setup_option(name, args, setup);
-        } else if (name == "-o" || name == "--output") {
-            output = args.value(name);
-        } else if (!name.empty() && name[0] != '-' && !named) {
-            g.gesture = name;
-            named = true;
-        } else {
-            usage_error("unknown argument " + quoted(name) + " (see kova gesture --help)");
-        }
-    }
+};
+
+int run_gesture(const GestureCommand& o) {
     const auto events =
-        builtin_gesture(g.gesture, g.touch_rate, setup.format.width, setup.format.height);
-    if (events.empty()) {
-        usage_error("gesture " + quoted(g.gesture) +
-                    " is unknown (accepted: " + kBuiltinGestureNames + ")");
-    }
-    if (output.empty()) {
+        builtin_gesture(o.gesture.gesture, o.gesture.touch_rate, o.format.width, o.format.height);
+    if (o.output.empty()) {
         write_gesture_csv(out(), events);
         return kExitOk;
     }
-    OutputFile file(output);
+    OutputFile file(o.output);
     std::FILE* f = fdopen(dup(file.fd()), "w");
-    if (!f) failure("cannot write " + quoted(output));
+    if (!f) failure("cannot write " + in_quotes(o.output));
     write_gesture_csv(f, events);
-    if (std::fclose(f) != 0) failure("cannot write " + quoted(output));
+    if (std::fclose(f) != 0) failure("cannot write " + in_quotes(o.output));
     file.commit();
     return kExitOk;
+}
+
+}  // namespace
+
+Run add_gesture(CLI::App& app) {
+    auto o = std::make_shared<GestureCommand>();
+    CLI::App* sub = app.add_subcommand(
+        "gesture", "print a built-in gesture as CSV, a start for gestures of your own");
+    sub->add_option("name", o->gesture.gesture, "slow, fast or strokes (default strokes)")
+        ->check(CLI::IsMember({"slow", "fast", "strokes"}))
+        ->type_name("NAME");
+    sub->add_option("--touch-rate", o->gesture.touch_rate, "event rate, 10..300 Hz (default 120)")
+        ->check(in_range(10, 300, "Hz", true))
+        ->type_name("HZ");
+    add_size(*sub, "--screen", o->format.width, o->format.height, 1, 100000, 1, 100000,
+             "screen size in pixels (default 1080x2280)");
+    sub->add_option("-o,--output", o->output, "write to FILE instead of standard output")
+        ->type_name("FILE");
+    return [o] { return run_gesture(*o); };
 }
 
 }  // namespace kova_tool

@@ -1,67 +1,69 @@
 /* kova: hear and see what a stroke sounds like, and shape source sets offline, through the
  * exported C interface of libKovaFastTrack. */
+#include <CLI/CLI.hpp>
 #include <cstdio>
-#include <cstring>
 #include <exception>
+#include <sstream>
 #include <string>
 
 #include "cli.h"
 #include "commands.h"
 
-namespace {
-
-const char* const kUsage =
-    "Usage: kova <command> [options]\n"
-    "\n"
-    "Commands:\n"
-    "  render    play a gesture through the engine into a WAV file (and a PNG picture)\n"
-    "  play      play a gesture live through the low-latency output stream\n"
-    "  save      build a source set and save it as a source-set file\n"
-    "  inspect   show what a saved source-set file holds (--json for JSON)\n"
-    "  gesture   print a built-in gesture as CSV\n"
-    "\n"
-    "kova <command> --help shows the options of a command.\n"
-    "Exit codes: 0 success, 1 the library or a file failed, 2 bad usage.\n";
-
-}  // namespace
-
 int main(int argc, char** argv) {
     using namespace kova_tool;
     init_output();
-    if (argc < 2) {
-        std::fputs(kUsage, stderr);
-        return kExitUsage;
+    CLI::App app(
+        "kova: hear and see what a stroke sounds like, and shape source sets offline, through "
+        "libKovaFastTrack.",
+        "kova");
+    app.set_version_flag("--version", "kova " KOVA_TOOL_VERSION);
+    app.require_subcommand(1);
+    app.fallthrough();
+    app.footer(
+        "kova <command> --help shows the options of a command.\n"
+        "Exit codes: 0 success, 1 the library or a file failed, 2 bad usage, 130 "
+        "interrupted.");
+    bool quiet = false, verbose = false;
+    app.add_flag("-q,--quiet", quiet, "print nothing but errors and the data asked for");
+    app.add_flag("-v,--verbose", verbose, "also show the library's own diagnostic lines");
+    const std::pair<const char*, Run> commands[] = {{"render", add_render(app)},
+                                                    {"play", add_play(app)},
+                                                    {"save", add_save(app)},
+                                                    {"inspect", add_inspect(app)},
+                                                    {"gesture", add_gesture(app)}};
+
+    // Messages name the command given, as "kova render: ...".
+    std::string prefix = "kova";
+    for (const auto& command : commands) {
+        if (argc > 1 && command.first == std::string(argv[1])) prefix += " " + std::string(argv[1]);
     }
-    const std::string command = argv[1];
-    if (command == "--help" || command == "-h" || command == "help") {
-        std::fputs(kUsage, out());
-        return kExitOk;
+    if (argc > 1 && argv[1][0] != '-' && prefix == "kova") {
+        std::fprintf(stderr, "kova: unknown command '%s' (see kova --help)\n", argv[1]);
+        return kExitUsage;
     }
     int rc = kExitOk;
     try {
-        Args args(argc, argv, 2);
-        if (command == "render") {
-            rc = run_render(args);
-        } else if (command == "play") {
-            rc = run_play(args);
-        } else if (command == "save") {
-            rc = run_save(args);
-        } else if (command == "inspect") {
-            rc = run_inspect(args);
-        } else if (command == "gesture") {
-            rc = run_gesture(args);
-        } else {
-            std::fflush(out());
-            std::fprintf(stderr, "kova: unknown command '%s' (see kova --help)\n", command.c_str());
-            return kExitUsage;
+        app.parse(argc, argv);
+        set_quiet(quiet);
+        set_library_chatter(verbose);
+        for (const auto& [name, run] : commands) {
+            if (app.got_subcommand(name)) rc = run();
         }
+    } catch (const CLI::Success& e) {
+        // Help and version go to the tool's own output (descriptor 1 may be silenced).
+        std::ostringstream text;
+        rc = app.exit(e, text, text);
+        std::fputs(text.str().c_str(), out());
+    } catch (const CLI::ParseError& e) {
+        std::fprintf(stderr, "%s: %s (see %s --help)\n", prefix.c_str(), e.what(), prefix.c_str());
+        rc = kExitUsage;
     } catch (const ToolError& e) {
         std::fflush(out());
-        std::fprintf(stderr, "kova %s: %s\n", command.c_str(), e.what());
+        std::fprintf(stderr, "%s: %s\n", prefix.c_str(), e.what());
         rc = e.code();
     } catch (const std::exception& e) {
         std::fflush(out());
-        std::fprintf(stderr, "kova %s: %s\n", command.c_str(), e.what());
+        std::fprintf(stderr, "%s: %s\n", prefix.c_str(), e.what());
         rc = kExitFailure;
     }
     std::fflush(out());

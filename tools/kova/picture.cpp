@@ -316,7 +316,7 @@ void draw_and_write(OutputFile& file, const std::vector<int16_t>& pcm, uint32_t 
                                    static_cast<int>(opts.height)),
         cairo_surface_destroy);
     if (cairo_surface_status(surface.get()) != CAIRO_STATUS_SUCCESS) {
-        failure("cannot draw " + quoted(path) + ": " +
+        failure("cannot draw " + in_quotes(path) + ": " +
                 cairo_status_to_string(cairo_surface_status(surface.get())));
     }
     std::unique_ptr<cairo_t, decltype(&cairo_destroy)> cr_owner(cairo_create(surface.get()),
@@ -363,7 +363,7 @@ void draw_and_write(OutputFile& file, const std::vector<int16_t>& pcm, uint32_t 
     int fd = file.fd();
     const cairo_status_t st = cairo_surface_write_to_png_stream(surface.get(), write_to_fd, &fd);
     if (st != CAIRO_STATUS_SUCCESS)
-        failure("cannot write " + quoted(path) + ": " + cairo_status_to_string(st));
+        failure("cannot write " + in_quotes(path) + ": " + cairo_status_to_string(st));
 }
 
 }  // namespace

@@ -7,9 +7,9 @@
 
 #include <atomic>
 #include <csignal>
-#include <cstring>
 #include <memory>
 #include <optional>
+#include <thread>
 
 #include "commands.h"
 #include "gesture.h"
@@ -19,31 +19,25 @@
 namespace kova_tool {
 namespace {
 
-const char* const kHelp =
-    "Usage: kova play [options]\n"
-    "Plays a gesture live: each event is generated at its own time and written to the low-latency\n"
-    "output stream, which plays it on the sound device (ALSA). Without a sound device, --capture\n"
-    "still runs the stream in real time and writes what the device would have received (the\n"
-    "blocks back to back; pauses where the stream had nothing are not in the file).\n"
-    "A status line on a terminal shows the elapsed time, the stream's ring-buffer fill and the\n"
-    "underruns counted while a stroke is held (bursts the device asked for and got short).\n"
-    "\n"
-    "Output:\n"
-    "  --device NAME        ALSA playback device (default \"default\")\n"
-    "  --capture FILE       write the stream to a WAV file instead of the sound device\n"
-    "  --thickness X        equaliser thickness, 0..1 (default: the set's, 0.6)\n"
-    "  --volume X           output volume, 0..1 (default 1)\n"
-    "  -v, --verbose        also show the library's and the stream's diagnostic lines\n";
-
 constexpr long kStatusPeriodMs = 100;
 /* After the last event, the device plays out the stream's queue; waiting longer than the queue
  * can hold means the device stopped pulling. */
 constexpr long kDrainSlackMs = 2000;
+/* After SIGINT or SIGTERM the tool is gone within this, even when the device blocks the stream's
+ * teardown: what is left then is left to the system. */
+constexpr long kSignalGraceMs = 700;
 
-std::atomic<bool> g_interrupted{false};
+struct PlayOptions {
+    SetupOptions setup;
+    GestureOptions gesture;
+    std::string device = "default";
+    std::optional<std::string> capture;
+};
 
-void on_signal(int) {
-    g_interrupted.store(true);
+std::atomic<int> g_signal{0};
+
+void on_signal(int sig) {
+    g_signal.store(sig);
 }
 
 int64_t now_ms() {
@@ -73,107 +67,129 @@ uint32_t ring_fill(KOVA_FASTTRACK* ft) {
     return n;
 }
 
-class Status {
-   public:
-    Status(KOVA_FASTTRACK* ft, const KOVA_FORMAT& f)
-        : ft_(ft),
-          bytes_per_ms_(f.sample_rate * f.channels * 2 / 1000.0),
-          tty_(isatty(STDERR_FILENO) == 1) {}
+/* What the run did so far; read by the watchdog thread too, hence atomics. */
+struct Counts {
+    std::atomic<size_t> events{0}, blocks{0}, dropped{0};
+    std::atomic<uint64_t> bytes{0};
+    std::atomic<unsigned long> underruns{0}; /* while a stroke is held, not in pauses */
+    unsigned long stroke_base = 0;           /* the device's count when the stroke began */
+    bool in_stroke = false;
+    size_t total_events = 0;
+    int64_t start_ms = 0;
+    std::optional<std::string> capture;
+    std::string capture_temp; /* removed if the watchdog ends the process */
+    std::atomic<bool> reported{false};
 
-    void stroke_begins() {
-        in_stroke_ = true;
-        base_ = kova_host_underruns();
+    void stroke(bool begins) {
+        if (in_stroke) underruns += kova_host_underruns() - stroke_base;
+        stroke_base = kova_host_underruns();
+        in_stroke = begins;
     }
-    void stroke_ends() {
-        if (in_stroke_) underruns_ += kova_host_underruns() - base_;
-        in_stroke_ = false;
+
+    /* The summary line, printed once by whoever gets here first. */
+    void report(int sig) {
+        if (reported.exchange(true)) return;
+        const double s = (now_ms() - start_ms) / 1000.0;
+        std::fprintf(info(),
+                     "%s %zu of %zu events in %.2f s: %zu blocks (%llu bytes), %zu dropped "
+                     "(stream full), underruns during strokes %lu\n",
+                     sig ? "interrupted: played" : "played", events.load(), total_events, s,
+                     blocks.load(), static_cast<unsigned long long>(bytes.load()), dropped.load(),
+                     underruns.load());
+        if (sig && capture)
+            std::fprintf(info(), "capture not written: %s left as it was\n", capture->c_str());
+        std::fflush(info());
     }
-    unsigned long underruns() const {
-        return underruns_ + (in_stroke_ ? kova_host_underruns() - base_ : 0);
-    }
+};
+
+/* The status line on a terminal, refreshed while the command waits:
+ * "[#########-------]  1.20 / 3.18 s   ring  45 ms   dropped 0   underruns 0". */
+struct Status {
+    KOVA_FASTTRACK* ft;
+    double bytes_per_ms;
+    int64_t total_ms;
+    const Counts& counts;
+    bool tty = isatty(STDERR_FILENO) == 1 && !quiet();
+    bool shown = false;
 
     void show(int64_t elapsed_ms) {
-        if (!tty_) return;
-        const uint32_t fill = ring_fill(ft_);
-        const uint32_t capacity = ft_->pRing ? ft_->pRing->size - 1 : 1;
-        std::fprintf(stderr, "\r  %6.2f s   ring %5.1f%% (%4.0f ms)   underruns %lu   ",
-                     elapsed_ms / 1000.0, 100.0 * fill / capacity, fill / bytes_per_ms_,
-                     underruns());
+        if (!tty) return;
+        constexpr int64_t kWidth = 24;
+        const auto done = static_cast<size_t>(std::min(elapsed_ms, total_ms) * kWidth / total_ms);
+        std::fprintf(stderr,
+                     "\r  [%s%s] %6.2f / %.2f s   ring %4.0f ms   dropped %zu   underruns %lu ",
+                     std::string(done, '#').c_str(), std::string(kWidth - done, '-').c_str(),
+                     elapsed_ms / 1000.0, total_ms / 1000.0, ring_fill(ft) / bytes_per_ms,
+                     counts.dropped.load(), counts.underruns.load());
         std::fflush(stderr);
-        shown_ = true;
+        shown = true;
     }
     void finish() {
-        if (shown_) std::fputc('\n', stderr);
-        shown_ = false;
+        if (shown) std::fputc('\n', stderr);
     }
-
-   private:
-    KOVA_FASTTRACK* ft_;
-    double bytes_per_ms_;
-    bool tty_;
-    bool shown_ = false;
-    bool in_stroke_ = false;
-    unsigned long base_ = 0;
-    unsigned long underruns_ = 0;
 };
 
 /* Sleeps until `until` (monotonic ms), refreshing the status line on the way. */
 void wait_until(int64_t until, int64_t start, Status& status) {
     for (;;) {
         const int64_t now = now_ms();
-        if (now >= until || g_interrupted.load()) return;
+        if (now >= until || g_signal.load()) return;
         status.show(now - start);
         sleep_ms(std::min<int64_t>(until - now, kStatusPeriodMs));
     }
 }
 
-}  // namespace
+/* Leaves the process kSignalGraceMs after a signal if the command has not returned by then:
+ * a device that never drains may block the stream's teardown. */
+void start_watchdog(Counts& counts) {
+    std::thread([&counts] {
+        while (!g_signal.load()) sleep_ms(20);
+        sleep_ms(kSignalGraceMs);
+        counts.report(g_signal.load());
+        if (!counts.capture_temp.empty()) unlink(counts.capture_temp.c_str());
+        _exit(128 + g_signal.load());
+    }).detach();
+}
 
-int run_play(Args& args) {
-    SetupOptions setup;
-    GestureOptions gesture;
-    std::string device = "default";
-    std::optional<std::string> capture;
-    const auto own = [&](const std::string& name) {
-        if (name == "--device") {
-            device = args.value(name);
-        } else if (name == "--capture") {
-            capture = args.value(name);
-        } else {
-            return false;
-        }
-        return true;
-    };
-    if (!read_gesture_command(args, "play", kHelp, setup, gesture, own)) return kExitOk;
-
+int run_play(PlayOptions& o) {
+    SetupOptions& setup = o.setup;
+    finish_setup(setup);
     const KOVA_FORMAT fmt = setup.format.format();
-    const std::vector<TouchEvent> events = load_gesture(gesture, fmt.w, fmt.h);
+    const std::vector<TouchEvent> events = load_gesture(o.gesture, fmt.w, fmt.h);
+
+    static Counts counts; /* outlives this function: the watchdog may read it until the exit */
+    counts.total_events = events.size();
+    counts.capture = o.capture;
+    counts.start_ms = now_ms();
+    g_signal.store(0);
+    struct sigaction sa {};
+    sa.sa_handler = on_signal;
+    sigaction(SIGINT, &sa, nullptr);
+    sigaction(SIGTERM, &sa, nullptr);
+    start_watchdog(counts);
 
     char why[256] = "";
-    const bool has_device = kova_host_alsa_probe(device.c_str(), why, sizeof why) == 0;
+    const bool has_device = kova_host_alsa_probe(o.device.c_str(), why, sizeof why) == 0;
     std::unique_ptr<OutputFile> capture_file;
-    if (capture) {
-        capture_file = std::make_unique<OutputFile>(*capture);
-        if (!has_device) {
-            std::fprintf(out(), "no sound device (ALSA %s: %s); capturing the stream to %s\n",
-                         device.c_str(), why, capture->c_str());
-        } else {
-            std::fprintf(out(), "capturing the stream to %s (the sound device is not used)\n",
-                         capture->c_str());
-        }
+    if (o.capture) {
+        capture_file = std::make_unique<OutputFile>(*o.capture);
+        counts.capture_temp = capture_file->temp_path();
+        if (!has_device)
+            std::fprintf(info(), "no sound device (ALSA %s: %s); ", o.device.c_str(), why);
+        std::fprintf(info(), "capturing the stream to %s\n", o.capture->c_str());
     } else if (!has_device) {
-        failure("no sound device (ALSA " + quoted(device) + ": " + why +
+        failure("no sound device (ALSA " + in_quotes(o.device) + ": " + why +
                 "); use --capture FILE to write the stream to a WAV file");
     }
 
     Engine engine(setup.format);
     prepare_set(engine, setup);
 
-    if (capture) {
+    if (o.capture) {
         kova_host_use_capture_sink();
         kova_host_capture_clear();
-    } else if (kova_host_use_alsa_sink(device.c_str(), why, sizeof why) != 0) {
-        failure("no sound device (ALSA " + quoted(device) + ": " + why + ")");
+    } else if (kova_host_use_alsa_sink(o.device.c_str(), why, sizeof why) != 0) {
+        failure("no sound device (ALSA " + in_quotes(o.device) + ": " + why + ")");
     }
     kova_host_reset_counters();
 
@@ -182,74 +198,88 @@ int run_play(Args& args) {
     if (!stream) failure("the output stream could not be opened");
     KOVA_FASTTRACK* ft = stream.get();
 
-    g_interrupted.store(false);
-    struct sigaction sa {};
-    sa.sa_handler = on_signal;
-    sigaction(SIGINT, &sa, nullptr);
-    sigaction(SIGTERM, &sa, nullptr);
-
-    if (!capture) std::fprintf(out(), "playing on ALSA device %s\n", device.c_str());
-    std::fflush(out());
+    if (!o.capture) std::fprintf(info(), "playing on ALSA device %s\n", o.device.c_str());
+    std::fflush(info());
     kova_start_fasttrack(ft);
-    Status status(ft, fmt);
-    std::vector<int16_t> block(kBlockBytes / 2);
-    size_t blocks = 0, dropped = 0;
-    uint64_t bytes_written = 0;
-    const int64_t start = now_ms();
     const int64_t t0 = events.front().time_ms;
+    const double bytes_per_ms = fmt.sample_rate * fmt.channels * 2 / 1000.0;
+    Status status{ft, bytes_per_ms, std::max<int64_t>(events.back().time_ms - t0, 1), counts};
+    std::vector<int16_t> block(kBlockBytes / 2);
+    const int64_t start = counts.start_ms = now_ms();
     for (const TouchEvent& e : events) {
         wait_until(start + (e.time_ms - t0), start, status);
-        if (g_interrupted.load()) break;
-        if (e.action == KOVA_ACTION_START) status.stroke_begins();
+        if (g_signal.load()) break;
+        if (e.action == KOVA_ACTION_START) counts.stroke(true);
         const int32_t bytes = generate_event(engine, e, block);
         if (bytes > 0) {
+            // All or nothing: a block that does not fit the ring is refused and dropped.
             const uint32_t n =
                 kova_write_fasttrack(ft, block.data(), kBlockBytes, static_cast<uint32_t>(bytes));
             if (n == static_cast<uint32_t>(bytes)) {
-                ++blocks;
-                bytes_written += n;
+                ++counts.blocks;
+                counts.bytes += n;
             } else {
-                ++dropped;  // the ring buffer was full: the stream drops a block that does not fit
+                ++counts.dropped;
             }
         }
-        if (e.action == KOVA_ACTION_END) status.stroke_ends();
+        ++counts.events;
+        if (e.action == KOVA_ACTION_END) counts.stroke(false);
     }
     // Let the device play out what is queued.
     const int64_t drain_deadline =
-        now_ms() +
-        static_cast<int64_t>(ring_fill(ft) / (fmt.sample_rate * fmt.channels * 2 / 1000.0)) +
-        kDrainSlackMs;
-    while (!g_interrupted.load() && ring_fill(ft) > 0 && now_ms() < drain_deadline) {
+        now_ms() + static_cast<int64_t>(ring_fill(ft) / bytes_per_ms) + kDrainSlackMs;
+    while (!g_signal.load() && ring_fill(ft) > 0 && now_ms() < drain_deadline) {
         status.show(now_ms() - start);
         sleep_ms(10);
     }
-    sleep_ms(2 * kStatusPeriodMs);  // the device's own buffer
-    status.stroke_ends();
+    if (!g_signal.load()) sleep_ms(2 * kStatusPeriodMs);  // the device's own buffer
+    if (const uint32_t left = ring_fill(ft); left > 0 && !g_signal.load())
+        note("the device stopped taking sound; " +
+             std::to_string(static_cast<int>(left / bytes_per_ms)) + " ms never played");
+    counts.stroke(false);
     status.show(now_ms() - start);
     status.finish();
+
+    if (const int sig = g_signal.load()) {
+        // An interrupted capture is incomplete: the target keeps what it held.
+        capture_file.reset();
+        counts.report(sig);
+        return 128 + sig;  // the stream closes on the way out, bounded by the watchdog
+    }
     kova_stop_fasttrack(ft);
     stream.reset();
-    signal(SIGINT, SIG_DFL);
-    signal(SIGTERM, SIG_DFL);
-
-    const double seconds = (now_ms() - start) / 1000.0;
-    std::fprintf(out(),
-                 "played %zu events in %.2f s: %zu blocks (%llu bytes), %zu dropped (stream full), "
-                 "underruns during strokes %lu\n",
-                 events.size(), seconds, blocks, static_cast<unsigned long long>(bytes_written),
-                 dropped, status.underruns());
+    counts.report(0);
     if (capture_file) {
         if (kova_host_capture_write_wav(capture_file->temp_path().c_str(),
                                         static_cast<int>(fmt.sample_rate),
                                         static_cast<int>(fmt.channels)) != 0) {
-            failure("cannot write " + quoted(*capture) + ": the capture could not be saved");
+            failure("cannot write " + in_quotes(*o.capture) + ": the capture could not be saved");
         }
         capture_file->commit();
-        std::fprintf(out(), "wrote %s: %.3f s captured\n", capture->c_str(),
+        std::fprintf(info(), "wrote %s: %.3f s captured\n", o.capture->c_str(),
                      kova_host_capture_size() / (fmt.sample_rate * fmt.channels * 2.0));
     }
-    if (g_interrupted.load()) failure("interrupted");
     return kExitOk;
+}
+
+}  // namespace
+
+Run add_play(CLI::App& app) {
+    auto o = std::make_shared<PlayOptions>();
+    CLI::App* sub = app.add_subcommand(
+        "play", "play a gesture live through the low-latency output stream (Ctrl-C: exit 130)");
+    add_gesture_options(*sub, o->gesture);
+    sub->add_option("--device", o->device, "ALSA playback device (default \"default\")")
+        ->type_name("NAME")
+        ->group("Output");
+    sub->add_option_function<std::string>(
+           "--capture", [o](const std::string& v) { o->capture = v; },
+           "write the stream to a WAV file instead of the sound device (the blocks back to "
+           "back; pauses where the stream had nothing are not in the file)")
+        ->type_name("FILE")
+        ->group("Output");
+    add_setup_options(*sub, o->setup, true);
+    return [o] { return run_play(*o); };
 }
 
 }  // namespace kova_tool

@@ -14,29 +14,13 @@
 namespace kova_tool {
 namespace {
 
-const char* const kHelp =
-    "Usage: kova render [options]\n"
-    "Plays a gesture through the engine and writes the sound as a WAV file, and on request a\n"
-    "picture of it (waveform and spectrogram). Blocks are queued one after another, as the live\n"
-    "stream plays them; a pause between strokes is silent up to the next event's time.\n"
-    "\n"
-    "Output:\n"
-    "  -o, --output FILE    WAV file to write (default stroke.wav)\n"
-    "  --png FILE           also write a PNG picture of the sound\n"
-    "  --png-size WxH       picture size, 400..8000 x 300..4000 (default 1200x720)\n"
-    "  --thickness X        equaliser thickness, 0..1 (default: the set's, 0.6)\n"
-    "  --volume X           output volume, 0..1 (default 1)\n"
-    "  -v, --verbose        also show the library's own diagnostic lines\n";
-
 /* Warns once when the gesture leaves the screen given by --screen: panning reads x against the
  * width, so positions outside it pan beyond the edge. */
 void check_on_screen(const std::vector<TouchEvent>& events, const KOVA_FORMAT& f) {
     for (const TouchEvent& e : events) {
         if (e.x > static_cast<float>(f.w) || e.y > static_cast<float>(f.h)) {
-            std::fprintf(stderr,
-                         "kova render: warning: the gesture reaches (%g, %g), outside the %ux%u "
-                         "screen (see --screen)\n",
-                         static_cast<double>(e.x), static_cast<double>(e.y), f.w, f.h);
+            note("the gesture reaches (" + num(e.x) + ", " + num(e.y) + "), outside the " +
+                 std::to_string(f.w) + "x" + std::to_string(f.h) + " screen (see --screen)");
             return;
         }
     }
@@ -51,32 +35,22 @@ double peak_dbfs(const std::vector<int16_t>& pcm) {
     return peak == 0 ? -INFINITY : 20.0 * std::log10(peak / 32768.0);
 }
 
-}  // namespace
-
-int run_render(Args& args) {
+struct RenderOptions {
     SetupOptions setup;
     GestureOptions gesture;
     std::string output = "stroke.wav";
     std::optional<std::string> png;
     PictureOptions picture;
-    const auto own = [&](const std::string& name) {
-        if (name == "-o" || name == "--output") {
-            output = args.value(name);
-        } else if (name == "--png") {
-            png = args.value(name);
-        } else if (name == "--png-size") {
-            std::tie(picture.width, picture.height) =
-                parse_size(name, args.value(name), kPictureMinWidth, kPictureMaxWidth,
-                           kPictureMinHeight, kPictureMaxHeight);
-        } else {
-            return false;
-        }
-        return true;
-    };
-    if (!read_gesture_command(args, "render", kHelp, setup, gesture, own)) return kExitOk;
+};
 
+int run_render(RenderOptions& o) {
+    SetupOptions& setup = o.setup;
+    PictureOptions& picture = o.picture;
+    const std::string& output = o.output;
+    const std::optional<std::string>& png = o.png;
+    finish_setup(setup);
     const KOVA_FORMAT fmt = setup.format.format();
-    const std::vector<TouchEvent> events = load_gesture(gesture, fmt.w, fmt.h);
+    const std::vector<TouchEvent> events = load_gesture(o.gesture, fmt.w, fmt.h);
     check_on_screen(events, fmt);
 
     // Both files are created first, so a folder that cannot be written fails before any work,
@@ -117,19 +91,42 @@ int run_render(Args& args) {
     if (png_file) png_file->commit();
 
     const double seconds = static_cast<double>(timeline.frames()) / fmt.sample_rate;
-    std::fprintf(out(),
+    std::fprintf(info(),
                  "gesture: %zu events, %zu moves, %zu of them too short or too small to sound\n",
                  events.size(), moves, silent_moves);
-    std::fprintf(out(), "wrote %s: %.3f s, %u Hz, %u channel%s, peak %.1f dBFS\n", output.c_str(),
+    std::fprintf(info(), "wrote %s: %.3f s, %u Hz, %u channel%s, peak %.1f dBFS\n", output.c_str(),
                  seconds, fmt.sample_rate, fmt.channels, fmt.channels == 1 ? "" : "s",
                  peak_dbfs(timeline.pcm()));
-    if (timeline.frames() == 0)
-        std::fprintf(stderr, "kova render: warning: the gesture made no sound\n");
+    if (timeline.frames() == 0) note("the gesture made no sound");
     if (png) {
-        std::fprintf(out(), "wrote %s: %ux%u picture\n", png->c_str(), picture.width,
+        std::fprintf(info(), "wrote %s: %ux%u picture\n", png->c_str(), picture.width,
                      picture.height);
     }
     return kExitOk;
+}
+
+}  // namespace
+
+Run add_render(CLI::App& app) {
+    auto o = std::make_shared<RenderOptions>();
+    CLI::App* sub = app.add_subcommand(
+        "render", "play a gesture through the engine into a WAV file (and a PNG picture)");
+    add_gesture_options(*sub, o->gesture);
+    sub->add_option("-o,--output", o->output,
+                    "WAV file to write, - for standard output (default stroke.wav)")
+        ->type_name("FILE")
+        ->group("Output");
+    sub->add_option_function<std::string>(
+           "--png", [o](const std::string& v) { o->png = v; },
+           "also write a PNG picture of the sound (waveform and spectrogram)")
+        ->type_name("FILE")
+        ->group("Output");
+    add_size(*sub, "--png-size", o->picture.width, o->picture.height, kPictureMinWidth,
+             kPictureMaxWidth, kPictureMinHeight, kPictureMaxHeight,
+             "picture size, 400..8000 x 300..4000 (default 1200x720)")
+        ->group("Output");
+    add_setup_options(*sub, o->setup, true);
+    return [o] { return run_render(*o); };
 }
 
 }  // namespace kova_tool

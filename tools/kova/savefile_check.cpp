@@ -2,11 +2,10 @@
 
 #include <kova/kova_types.h>
 
-#include <cerrno>
-#include <cstring>
-#include <fstream>
+#include <unistd.h>
 
 #include "cli.h"
+#include "input_file.h"
 
 namespace kova_tool {
 namespace {
@@ -17,33 +16,28 @@ constexpr int32_t kSlotMax[KOVA_SLOT_COUNT] = {KOVA_SLOT_START_MAX_BYTES, KOVA_S
                                                KOVA_SLOT_END_MAX_BYTES};
 
 template <typename T>
-bool read_at(std::ifstream& in, std::streamoff pos, T& value) {
-    in.clear();
-    in.seekg(pos);
-    in.read(reinterpret_cast<char*>(&value), sizeof value);
-    return static_cast<size_t>(in.gcount()) == sizeof value;
+bool read_at(const InputFile& in, int64_t pos, T& value) {
+    return pread(in.fd(), &value, sizeof value, static_cast<off_t>(pos)) ==
+           static_cast<ssize_t>(sizeof value);
 }
 
 }  // namespace
 
 SavedFormat check_source_set_file(const std::string& path, bool need_loop) {
-    std::ifstream in(path, std::ios::binary);
-    if (!in) failure("cannot read source-set file " + quoted(path) + ": " + std::strerror(errno));
-    in.seekg(0, std::ios::end);
-    const std::streamoff size = in.tellg();
+    const InputFile in(path, "source-set file");
+    const int64_t size = in.size();
     auto reject = [&](const std::string& why) {
-        failure(quoted(path) + " is not a source-set file (" + why + ")");
+        failure(in_quotes(path) + " is not a source-set file (" + why + ")");
     };
     int32_t count = 0;
     if (size < 4 || !read_at(in, 0, count)) reject("shorter than 4 bytes");
     if (count < 0 || count > kMaxFilters)
         reject("filter count " + std::to_string(count) + " outside 0.." +
                std::to_string(kMaxFilters));
-    const std::streamoff info_at =
-        4 + 40LL * count + static_cast<std::streamoff>(sizeof(KOVA_TUNE_SET));
+    const int64_t info_at = 4 + 40LL * count + static_cast<int64_t>(sizeof(KOVA_TUNE_SET));
     KOVA_SRC_INFO info{};
     if (!read_at(in, info_at, info)) reject("it ends before its slot table");
-    std::streamoff pos = info_at + static_cast<std::streamoff>(sizeof info);
+    int64_t pos = info_at + static_cast<int64_t>(sizeof info);
     for (int s = 0; s < KOVA_SLOT_COUNT; ++s) {
         if (info.has_src[s] != 1) continue;
         KOVA_SRC rec{};
@@ -53,11 +47,11 @@ SavedFormat check_source_set_file(const std::string& path, bool need_loop) {
             reject("slot " + std::to_string(s) + " claims " + std::to_string(rec.size) +
                    " bytes, accepted 1.." + std::to_string(kSlotMax[s]));
         }
-        pos += static_cast<std::streamoff>(sizeof rec) + rec.size;
+        pos += static_cast<int64_t>(sizeof rec) + rec.size;
         if (pos > size) reject("slot " + std::to_string(s) + " runs past the end of the file");
     }
     if (need_loop && info.has_src[KOVA_SLOT_LOOP] != 1) {
-        failure(quoted(path) + " has no loop sound, so it cannot play a stroke");
+        failure(in_quotes(path) + " has no loop sound, so it cannot play a stroke");
     }
     return {info.samplerate, info.channels};
 }

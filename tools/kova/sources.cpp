@@ -13,112 +13,43 @@
 #include <memory>
 #include <vector>
 
+#include "builtin_set.h"
 #include "builtin_sounds.h"
+#include "scratch_dir.h"
+#include "sound_input.h"
 #include "savefile_check.h"
 
 namespace kova_tool {
 namespace {
 
-constexpr uint32_t kSlotMax[KOVA_SLOT_COUNT] = {KOVA_SLOT_START_MAX_BYTES, KOVA_SLOT_LOOP_MAX_BYTES,
-                                                KOVA_SLOT_END_MAX_BYTES};
-
-/* The built-in loop: white noise through a band-pass from about 1 to 4 kHz, the scratch of a pen
- * on paper. */
-constexpr double kBuiltinFilterHz = 2500.0;
-constexpr double kBuiltinFilterBandHz = 3000.0;
-
-/* A private folder for the built-in start and end sounds while the set is built: the engine
- * registers sounds from files only. Removed with everything in it when the set is done. */
-class TempDir {
-   public:
-    TempDir() {
-        const char* base = std::getenv("TMPDIR");
-        std::string tmpl = std::string(base && *base ? base : "/tmp") + "/kova-XXXXXX";
-        std::vector<char> buf(tmpl.begin(), tmpl.end());
-        buf.push_back('\0');
-        if (!mkdtemp(buf.data()))
-            failure("cannot create a temporary folder: " + std::string(std::strerror(errno)));
-        path_ = buf.data();
-    }
-    ~TempDir() {
-        for (const std::string& f : files_) unlink(f.c_str());
-        rmdir(path_.c_str());
-    }
-    TempDir(const TempDir&) = delete;
-    TempDir& operator=(const TempDir&) = delete;
-
-    std::string write(const std::string& name, const std::vector<int16_t>& pcm) {
-        const std::string file = path_ + "/" + name;
-        files_.push_back(file);
-        std::FILE* f = std::fopen(file.c_str(), "wb");
-        const size_t n = f ? std::fwrite(pcm.data(), sizeof(int16_t), pcm.size(), f) : 0;
-        if (!f || n != pcm.size() || std::fclose(f) != 0) {
-            failure("cannot write the built-in sound " + quoted(file) + ": " +
-                    std::strerror(errno));
-        }
-        return file;
-    }
-
-   private:
-    std::string path_;
-    std::vector<std::string> files_;
-};
-
-/* A raw PCM input must be a readable, non-empty regular file; longer ones are cut by the slot. */
-void check_pcm_file(int slot, const std::string& path, const KOVA_FORMAT& fmt) {
-    struct stat st {};
-    if (stat(path.c_str(), &st) != 0) {
-        failure("cannot read " + std::string(slot_name(slot)) + " sound " + quoted(path) + ": " +
-                std::strerror(errno));
-    }
-    if (!S_ISREG(st.st_mode))
-        failure(std::string(slot_name(slot)) + " sound " + quoted(path) + " is not a file");
-    if (access(path.c_str(), R_OK) != 0) {
-        failure("cannot read " + std::string(slot_name(slot)) + " sound " + quoted(path) + ": " +
-                std::strerror(errno));
-    }
-    if (st.st_size == 0)
-        failure(std::string(slot_name(slot)) + " sound " + quoted(path) + " is empty");
-    if (static_cast<uint64_t>(st.st_size) > kSlotMax[slot]) {
-        const double ms = kSlotMax[slot] * 1000.0 / (2.0 * fmt.sample_rate * fmt.channels);
-        std::fprintf(
-            stderr, "kova: note: %s is %lld bytes; the %s slot keeps the first %u (%.0f ms)\n",
-            path.c_str(), static_cast<long long>(st.st_size), slot_name(slot), kSlotMax[slot], ms);
-    }
-}
-
 void check(int32_t code, const std::string& what) {
     if (code != KOVA_OK) failure(what + ": " + library_error(code));
 }
 
-/* Slot paths for the engine: user files as given, "builtin" written to the temporary folder,
- * empty ones null. */
+/* Slot paths for the engine: every sound converted to its format and written to the scratch
+ * folder (the engine reads raw PCM files only), empty slots null. */
 struct SlotPaths {
     std::string path[KOVA_SLOT_COUNT];
     const char* ptr[KOVA_SLOT_COUNT] = {nullptr, nullptr, nullptr};
     bool any = false;
 };
 
-SlotPaths slot_paths(const SourceOptions& src, const KOVA_FORMAT& fmt, TempDir*& temp,
-                     std::unique_ptr<TempDir>& temp_owner) {
+SlotPaths slot_paths(const SourceOptions& src, const KOVA_FORMAT& fmt, ScratchDir& scratch) {
     SlotPaths p;
     for (int s = 0; s < KOVA_SLOT_COUNT; ++s) {
-        if (src.slot[s].empty()) continue;
-        if (src.slot[s] == kBuiltinSound) {
-            if (!temp) {
-                temp_owner = std::make_unique<TempDir>();
-                temp = temp_owner.get();
-            }
-            p.path[s] =
+        const std::string& given = src.slot[static_cast<size_t>(s)];
+        if (given.empty()) continue;
+        const std::string name = std::string(slot_name(s)) + ".pcm";
+        if (given == kBuiltinSound) {
+            p.path[s] = scratch.write(
+                name,
                 s == KOVA_SLOT_START
-                    ? temp->write("start.pcm",
-                                  builtin_start_sound(fmt.sample_rate, fmt.channels, kSlotMax[s]))
-                    : temp->write("end.pcm",
-                                  builtin_end_sound(fmt.sample_rate, fmt.channels, kSlotMax[s]));
+                    ? builtin_start_sound(fmt.sample_rate, fmt.channels, KOVA_SLOT_START_MAX_BYTES)
+                    : builtin_end_sound(fmt.sample_rate, fmt.channels, KOVA_SLOT_END_MAX_BYTES));
         } else {
-            check_pcm_file(s, src.slot[s], fmt);
-            p.path[s] = src.slot[s];
+            p.path[s] = scratch.write(name, read_sound(given, s, fmt, src.raw));
         }
+        if (p.path[s].empty()) failure("cannot write the " + name + " sound to a temporary folder");
         p.ptr[s] = p.path[s].c_str();
         p.any = true;
     }
@@ -144,8 +75,14 @@ void apply_repeats(Engine& engine, int32_t id, const std::vector<RepeatArg>& rep
             usage_error(opt + " end 0 is out of range (accepted: 1.." + std::to_string(len) +
                         " ms)");
         }
-        if (r.start_ms >= 0) want.rpt_start_ms[r.slot] = r.start_ms;
-        if (r.end_ms >= 0) want.rpt_end_ms[r.slot] = r.end_ms;
+        // A number left out keeps the value before, so the order is checked on the result.
+        if (r.start_ms >= 0) want.rpt_start_ms[r.slot] = now.rpt_start_ms[r.slot] = r.start_ms;
+        if (r.end_ms >= 0) want.rpt_end_ms[r.slot] = now.rpt_end_ms[r.slot] = r.end_ms;
+        if (now.rpt_start_ms[r.slot] > now.rpt_end_ms[r.slot]) {
+            usage_error(opt + ": start " + std::to_string(now.rpt_start_ms[r.slot]) +
+                        " is after end " + std::to_string(now.rpt_end_ms[r.slot]) +
+                        " (START_MS must not exceed END_MS)");
+        }
     }
     check(kova_set_rptinfo(engine.ctx(), id, &want), "setting the repeat points");
 }
@@ -170,16 +107,15 @@ void apply_pair(std::string_view name, std::string_view depth_name, const std::o
 
 void apply_tune(Engine& engine, int32_t id, const TuneOptions& t, const KOVA_TUNE_SET& base) {
     KOVA_TUNE_SET tune = base;
-    auto take = [](const std::optional<double>& v, double& field) {
-        if (v) field = *v;
-    };
-    take(t.gain, tune.gain);
-    take(t.pan, tune.pan);
-    take(t.wn_gain, tune.wn_gain);
-    take(t.file_gain, tune.file_gain);
-    take(t.start_gain, tune.start_gain);
-    take(t.loop_gain, tune.loop_gain);
-    take(t.end_gain, tune.end_gain);
+    const std::pair<const std::optional<double>&, double&> given[] = {
+        {t.gain, tune.gain},
+        {t.pan, tune.pan},
+        {t.wn_gain, tune.wn_gain},
+        {t.file_gain, tune.file_gain},
+        {t.start_gain, tune.start_gain},
+        {t.loop_gain, tune.loop_gain},
+        {t.end_gain, tune.end_gain}};
+    for (const auto& [value, field] : given) field = value.value_or(field);
     apply_pair("--osc", "--osc-depth", t.osc, t.osc_depth, tune.osc_enable, tune.osc_depth);
     apply_pair("--sharp", "--sharpness", t.sharp, t.sharpness, tune.sharp_enable, tune.sharpness);
     check(kova_set_tuneset(engine.ctx(), id, &tune), "setting the tune set");
@@ -204,89 +140,53 @@ int32_t generate_event(const Engine& engine, const TouchEvent& e, std::vector<in
 }
 
 std::string library_error(int32_t code) {
-    const char* what = "unknown error";
-    switch (code) {
-        case KOVA_ERR_INVALID_FORMAT:
-            what = "format rejected";
-            break;
-        case KOVA_ERR_INSUFF_MEM:
-            what = "out of memory";
-            break;
-        case KOVA_ERR_INVALID_PARAM:
-            what = "invalid parameter";
-            break;
-        case KOVA_ERR_SOURCE:
-            what = "sound source could not be loaded";
-            break;
-        case KOVA_ERR_SRC_FULL:
-            what = "too many source sets";
-            break;
-        default:
-            break;
-    }
-    return std::string(what) + " (library code " + std::to_string(code) + ")";
-}
-
-KOVA_FLT_DSC builtin_filter(const KOVA_FORMAT& format) {
-    KOVA_FLT_DSC d{};
-    d.type = KOVA_FLT_BANDPASS;
-    // Below 8 kHz of Nyquist the band is pulled down with it, so low rates still get a band.
-    d.freq = std::min(kBuiltinFilterHz, format.sample_rate * 0.25);
-    d.bandwidth = std::min(kBuiltinFilterBandHz, format.sample_rate * 0.3);
-    d.enable = 1;
-    d.samplerate = static_cast<int32_t>(format.sample_rate);
-    d.channels = static_cast<int32_t>(format.channels);
-    return d;
+    static const char* const what[] = {"format rejected", "out of memory", "invalid parameter",
+                                       "sound source could not be loaded", "too many source sets"};
+    return std::string(code <= -1 && code >= -5 ? what[-code - 1] : "unknown error") +
+           " (library code " + std::to_string(code) + ")";
 }
 
 PreparedSet prepare_set(Engine& engine, const SetupOptions& setup) {
     const KOVA_FORMAT& fmt = engine.format();
-    SourceOptions src = setup.source;
-    if (src.builtin()) {
-        FilterArg f;
-        f.text = "builtin";
-        f.dsc = builtin_filter(fmt);
-        src.filters.push_back(f);
-        src.slot[KOVA_SLOT_START] = std::string(kBuiltinSound);
-        src.slot[KOVA_SLOT_END] = std::string(kBuiltinSound);
-    }
+    const SourceOptions& src = setup.source;
     if (!src.set_path.empty()) {
         const SavedFormat saved =
             check_source_set_file(src.set_path, src.slot[KOVA_SLOT_LOOP].empty());
         // The file's samples play as they are: at another format they play at another pitch.
         if (saved.rate != static_cast<int32_t>(fmt.sample_rate) ||
             saved.channels != static_cast<int32_t>(fmt.channels)) {
-            std::fprintf(stderr,
-                         "kova: note: %s was saved for %d Hz, %d channel(s); it plays at %u Hz, "
-                         "%u channel(s)\n",
-                         src.set_path.c_str(), saved.rate, saved.channels, fmt.sample_rate,
-                         fmt.channels);
+            note(in_quotes(src.set_path) + " was saved for " + std::to_string(saved.rate) +
+                 " Hz, " + std::to_string(saved.channels) + " channel(s); it plays at " +
+                 std::to_string(fmt.sample_rate) + " Hz, " + std::to_string(fmt.channels) +
+                 " channel(s)");
         }
     }
 
-    std::unique_ptr<TempDir> temp_owner;
-    TempDir* temp = nullptr;
-    const SlotPaths paths = slot_paths(src, fmt, temp, temp_owner);
+    ScratchDir scratch; /* kept until the filters are attached: they reload file sounds */
+    const SlotPaths paths = slot_paths(src, fmt, scratch);
 
     KOVA_CTX* ctx = engine.ctx();
     PreparedSet set;
     int32_t err = KOVA_OK;
     size_t first_attached = 0;
     bool replace_slots = false;
-    if (!src.set_path.empty()) {
-        set.id = kova_reg_src_bysavefile(ctx, src.set_path.c_str(), &err);
-        if (!set.id)
-            failure("cannot register source-set file " + quoted(src.set_path) + ": " +
-                    library_error(err));
+    // Each call presets `err`; an id of 0 is a failure.
+    const auto need = [&err](int32_t id, const std::string& what) {
+        if (id == 0) failure("cannot " + what + ": " + library_error(err));
+        return id;
+    };
+    if (src.builtin()) {
+        set.id = need(register_builtin_set(ctx, fmt, &err), "register the built-in set");
+        set.noise_loop = true;
+    } else if (!src.set_path.empty()) {
+        set.id = need(kova_reg_src_bysavefile(ctx, src.set_path.c_str(), &err),
+                      "register source-set file " + in_quotes(src.set_path));
         replace_slots = paths.any;
     } else if (!src.slot[KOVA_SLOT_LOOP].empty()) {
-        set.id = kova_reg_src_byfiles(ctx, paths.ptr, &err);
-        if (!set.id) failure("cannot register the PCM files: " + library_error(err));
+        set.id = need(kova_reg_src_byfiles(ctx, paths.ptr, &err), "register the sound files");
     } else {
-        set.id = kova_reg_src_byfilter(ctx, &src.filters[0].dsc, &err);
-        if (!set.id)
-            failure("cannot register filter " + quoted(src.filters[0].text) + ": " +
-                    library_error(err));
+        set.id = need(kova_reg_src_byfilter(ctx, &src.filters[0].dsc, &err),
+                      "register filter " + in_quotes(src.filters[0].text));
         set.noise_loop = true;
         first_attached = 1;
         replace_slots = paths.any;
@@ -295,10 +195,8 @@ PreparedSet prepare_set(Engine& engine, const SetupOptions& setup) {
     KOVA_TUNE_SET base{};
     check(kova_get_tuneset(ctx, set.id, &base), "reading the tune set");
     if (replace_slots) {
-        err = KOVA_OK;
-        if (!kova_update_src_byfiles(ctx, set.id, paths.ptr, &err)) {
-            failure("cannot load the start/loop/end sounds: " + library_error(err));
-        }
+        need(kova_update_src_byfiles(ctx, set.id, paths.ptr, &err),
+             "load the start/loop/end sounds");
         if (paths.ptr[KOVA_SLOT_LOOP]) {
             // A new loop file takes the levels a file registration gives.
             set.noise_loop = false;
@@ -308,20 +206,15 @@ PreparedSet prepare_set(Engine& engine, const SetupOptions& setup) {
         // change how loud the loop plays.
     }
     for (size_t i = first_attached; i < src.filters.size(); ++i) {
-        err = KOVA_OK;
-        if (!kova_attach_filter(ctx, set.id, &src.filters[i].dsc, &err)) {
-            failure("cannot attach filter " + quoted(src.filters[i].text) + ": " +
-                    library_error(err));
-        }
+        need(kova_attach_filter(ctx, set.id, &src.filters[i].dsc, &err),
+             "attach filter " + in_quotes(src.filters[i].text));
     }
-    temp_owner.reset();
 
     check(kova_set_active_src(ctx, set.id), "selecting the source set");
     apply_repeats(engine, set.id, src.repeats);
     apply_tune(engine, set.id, setup.tune, base);
-    if (setup.level.thickness)
-        check(kova_set_thickness(ctx, *setup.level.thickness), "setting the thickness");
-    if (setup.level.volume) check(kova_set_volume(ctx, *setup.level.volume), "setting the volume");
+    if (setup.thickness) check(kova_set_thickness(ctx, *setup.thickness), "setting the thickness");
+    if (setup.volume) check(kova_set_volume(ctx, *setup.volume), "setting the volume");
     return set;
 }
 

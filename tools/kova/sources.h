@@ -45,9 +45,6 @@ int32_t generate_event(const Engine& engine, const TouchEvent& e, std::vector<in
 /* "source could not be loaded (-4)" and the like. */
 std::string library_error(int32_t code);
 
-/* The built-in set's noise filter. */
-KOVA_FLT_DSC builtin_filter(const KOVA_FORMAT& format);
-
 }  // namespace kova_tool
 
 #endif

@@ -1,6 +1,8 @@
 /* Command line of the kova tool: help, exit codes, and that bad values are named with their
  * accepted range and leave existing files alone. */
 #include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <unistd.h>
 
 #include "support/tool_run.h"
 
@@ -18,9 +20,17 @@ TEST(KovaCli, HelpListsCommandsAndOptions) {
     EXPECT_EQ(r.code, 0);
     EXPECT_NE(r.out.find("--gesture"), std::string::npos);
     EXPECT_NE(r.out.find("--png"), std::string::npos);
+    // The tune values each kind of set starts with, as the library and the built-in set give them.
+    EXPECT_NE(r.out.find("built-in   1     0.2   1         0.2       1       1"), std::string::npos)
+        << r.out;
+    EXPECT_NE(r.out.find("--loop     1     0.4   1         0.2       0       0.4       0.6"),
+              std::string::npos);
     r = run_kova({"play", "--help"}, dir.path());
     EXPECT_EQ(r.code, 0);
     EXPECT_NE(r.out.find("--capture"), std::string::npos);
+    r = run_kova({"--version"}, dir.path());
+    EXPECT_EQ(r.code, 0);
+    EXPECT_EQ(r.out.rfind("kova 1.", 0), 0u) << r.out;
 }
 
 TEST(KovaCli, MissingOrUnknownCommandIsUsageError) {
@@ -59,6 +69,12 @@ TEST(KovaCli, BadValuesNameTheValueAndTheRange) {
         {{"render", "--rate", "16000", "--filter", "lowpass:9000"}, "9000", "1..7999"},
         {{"render", "--png-size", "100x500"}, "100", "400..8000"},
         {{"save", "-o", "x.kset", "--repeat", "loop=0:5000"}, "5000", "0..1000"},
+        {{"save", "-o", "x.kset", "--repeat", "loop=600:100"}, "600", "after end 100"},
+        {{"save", "-o", "x.kset", "--repeat", "loop=900:", "--repeat", "loop=:800"},
+         "900",
+         "after end 800"},
+        {{"render", "--panning", "yes"}, "yes", "on or off"},
+        {{"play", "--osc", "1"}, "'1'", "on or off"},
     };
     TempDir dir;
     for (const BadValue& c : cases) {
@@ -94,6 +110,12 @@ TEST(KovaCli, BadInputFilesFailWithExitOneAndKeepTheOutput) {
     write_file(dir.file("bad.csv"), "time_ms,action,x,y\n0,down,10,10\n8,wiggle,20,20\n");
     write_file(dir.file("late.csv"), "time_ms,action,x,y\n100,down,10,10\n50,move,20,20\n");
     write_file(dir.file("empty.raw"), "");
+    write_file(dir.file("one.raw"), "x");
+    write_file(dir.file("noise.bin"), "not a sound");
+    ASSERT_EQ(mkfifo(dir.file("fifo").c_str(), 0600), 0);
+    write_file(dir.file("big.csv"), "");
+    ASSERT_EQ(truncate(dir.file("big.csv").c_str(), (64 << 20) + 1),
+              0);  // sparse, one byte too many
 
     struct Case {
         std::vector<std::string> args;
@@ -103,7 +125,17 @@ TEST(KovaCli, BadInputFilesFailWithExitOneAndKeepTheOutput) {
         {{"render", "--gesture", "bad.csv", "-o", "out.wav"}, "bad.csv:3:"},
         {{"render", "--gesture", "late.csv", "-o", "out.wav"}, "late.csv:3:"},
         {{"render", "--loop", "noloop.raw", "-o", "out.wav"}, "noloop.raw"},
-        {{"render", "--loop", "empty.raw", "-o", "out.wav"}, "empty"},
+        {{"render", "--loop", "empty.raw", "-o", "out.wav"}, "needs at least"},
+        {{"render", "--loop", "one.raw", "-o", "out.wav"},
+         "a loop sound needs at least 240 (5 ms)"},
+        {{"render", "--loop", "noise.bin", "-o", "out.wav"}, "--raw"},
+        {{"render", "--loop", "fifo", "-o", "out.wav"}, "FIFO, not a regular file"},
+        {{"render", "--set", ".", "-o", "out.wav"}, "it is a folder"},
+        {{"render", "--gesture", "/dev/zero", "-o", "out.wav"}, "device, not a regular file"},
+        {{"render", "--gesture", "fifo", "-o", "out.wav"}, "FIFO, not a regular file"},
+        {{"inspect", "fifo"}, "FIFO, not a regular file"},
+        {{"render", "--gesture", "big.csv", "-o", "out.wav"}, "more than the 67108864 accepted"},
+        {{"render", "-o", "fifo"}, "FIFO, not a regular file"},
         {{"render", "--set", "noset.kset", "-o", "out.wav"}, "noset.kset"},
         {{"render", "--set", "bad.csv", "-o", "out.wav"}, "not a source-set file"},
         {{"render", "-o", "no/such/dir/out.wav"}, "no/such/dir/out.wav"},
@@ -117,7 +149,28 @@ TEST(KovaCli, BadInputFilesFailWithExitOneAndKeepTheOutput) {
         EXPECT_NE(r.err.find(c.mention), std::string::npos) << r.err;
         EXPECT_EQ(read_file(dir.file("out.wav")), keep);
     }
-    EXPECT_EQ(dir.list().size(), 4u) << "a failed command left a file behind";
+    EXPECT_EQ(dir.list().size(), 8u) << "a failed command left a file behind";
+}
+
+/* A link is written through to its target; "-" is standard output, with the report on stderr. */
+TEST(KovaCli, OutputsThroughLinksAndToStandardOutput) {
+    TempDir dir;
+    write_file(dir.file("target.wav"), "old");
+    ASSERT_EQ(symlink("target.wav", dir.file("link.wav").c_str()), 0);
+    RunResult r = run_kova({"render", "--gesture", "fast", "-o", "link.wav"}, dir.path());
+    ASSERT_EQ(r.code, 0) << r.err;
+    struct stat st {};
+    ASSERT_EQ(lstat(dir.file("link.wav").c_str(), &st), 0);
+    EXPECT_TRUE(S_ISLNK(st.st_mode)) << "the link was replaced";
+    const std::string wav = read_file(dir.file("target.wav"));
+    r = run_kova({"render", "--gesture", "fast", "-o", "-"}, dir.path());
+    ASSERT_EQ(r.code, 0) << r.err;
+    EXPECT_EQ(r.out, wav) << "standard output holds the same WAV";
+    EXPECT_NE(r.err.find("wrote -"), std::string::npos) << r.err;
+    r = run_kova({"-q", "render", "--gesture", "fast", "-o", "q.wav"}, dir.path());
+    EXPECT_EQ(r.code, 0);
+    EXPECT_EQ(r.out + r.err, "") << "-q prints nothing";
+    EXPECT_EQ(read_file(dir.file("q.wav")), wav);
 }
 
 TEST(KovaCli, GestureCommandPrintsCsvThatRenderReads) {
@@ -130,6 +183,8 @@ TEST(KovaCli, GestureCommandPrintsCsvThatRenderReads) {
     EXPECT_NE(csv.find(",up,"), std::string::npos);
     // 300 ms at 60 Hz: moves every 16 or 17 ms.
     EXPECT_NE(csv.find("\n17,move,"), std::string::npos) << csv.substr(0, 200);
+    // As a spreadsheet saves it: with a UTF-8 byte-order mark.
+    write_file(dir.file("fast.csv"), "\xEF\xBB\xBF" + csv);
     r = run_kova({"render", "--gesture", "fast.csv", "-o", "fast.wav"}, dir.path());
     EXPECT_EQ(r.code, 0) << r.err;
     r = run_kova({"gesture", "zigzag"}, dir.path());

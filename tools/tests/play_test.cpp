@@ -1,6 +1,9 @@
 /* kova play on a machine without the named sound device: it says so, and --capture still runs the
  * stream in real time and writes what the device would have received. */
+#include <fcntl.h>
 #include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <unistd.h>
 
 #include <sstream>
 
@@ -14,7 +17,7 @@ const std::string kNoDevice = "kova-test-no-such-device";
 
 TEST(KovaPlay, CaptureHoldsEveryBlockWithoutADevice) {
     TempDir dir;
-    // Down, 20 moves of 10 ms at 1 px/ms, up: 80 ms + 200 ms + 120 ms of blocks.
+    // Down, 20 moves of 10 ms at 1 px/ms, up: 40 ms + 200 ms + 120 ms of blocks.
     std::ostringstream g;
     g << "time_ms,action,x,y\n0,down,100,100\n";
     for (int t = 10; t <= 200; t += 10) g << t << ",move," << 100 + t << ",100\n";
@@ -28,9 +31,48 @@ TEST(KovaPlay, CaptureHoldsEveryBlockWithoutADevice) {
     const Wav w = read_wav(dir.file("cap.wav"));
     EXPECT_EQ(w.rate, 48000);
     EXPECT_EQ(w.channels, 2);
-    EXPECT_EQ(w.frames(), static_cast<size_t>((80 + 200 + 120) * 48));
-    EXPECT_GT(rms(w, 0, 80 * 48), 300.0) << "start sound";
-    EXPECT_GT(rms(w, 80 * 48, 280 * 48), 300.0) << "loop";
+    EXPECT_EQ(w.frames(), static_cast<size_t>((40 + 200 + 120) * 48));
+    EXPECT_GT(rms(w, 0, 40 * 48), 300.0) << "start sound";
+    EXPECT_GT(rms(w, 40 * 48, 240 * 48), 300.0) << "loop";
+    EXPECT_NE(r.out.find("played 22 of 22 events"), std::string::npos) << r.out;
+    EXPECT_NE(r.out.find(" 0 dropped"), std::string::npos) << r.out;
+
+    // Ctrl-C: the existing file stays as it was, the summary tells what was played, exit 130.
+    const std::string before = read_file(dir.file("cap.wav"));
+    const RunResult c =
+        run_kova({"play", "--gesture", "slow", "--device", kNoDevice, "--capture", "cap.wav"},
+                 dir.path(), 1000);
+    EXPECT_EQ(c.code, 130) << c.err;
+    EXPECT_EQ(read_file(dir.file("cap.wav")), before);
+    EXPECT_EQ(dir.list().size(), 2u) << "a temporary file was left behind";
+    EXPECT_NE(c.out.find("interrupted: played "), std::string::npos) << c.out;
+    EXPECT_EQ(c.out.find(" 0 of "), std::string::npos) << "events before the signal played";
+    EXPECT_NE(c.out.find("cap.wav left as it was"), std::string::npos) << c.out;
+}
+
+/* A device that never drains: ALSA's file plugin writing into a FIFO whose reader never reads.
+ * The ring fills, later blocks are dropped and counted, and Ctrl-C ends the tool at once although
+ * closing the stream blocks. */
+TEST(KovaPlay, StalledDeviceDropsBlocksAndSignalEndsPromptly) {
+    TempDir dir;
+    const std::string fifo = dir.file("device.fifo");
+    ASSERT_EQ(mkfifo(fifo.c_str(), 0600), 0);
+    const int reader = open(fifo.c_str(), O_RDONLY | O_NONBLOCK);
+    ASSERT_GE(reader, 0);
+    write_file(dir.file("alsa.conf"), "pcm.stall { type file slave.pcm { type null } file \"" +
+                                          fifo + "\" format \"raw\" }\n");
+    // 6 s of moves, far more than the ring and the device's buffers hold.
+    std::ostringstream g;
+    g << "time_ms,action,x,y\n0,down,100,100\n";
+    for (int t = 10; t <= 6000; t += 10) g << t << ",move," << 100 + t / 10 % 2 * 10 << ",100\n";
+    write_file(dir.file("g.csv"), g.str());
+    const RunResult r = run_kova({"play", "--device", "stall", "--gesture", "g.csv"}, dir.path(),
+                                 5500, {"ALSA_CONFIG_PATH=" + dir.file("alsa.conf")});
+    close(reader);
+    EXPECT_EQ(r.code, 130) << r.err;
+    EXPECT_LT(r.exit_ms, 1000);
+    EXPECT_NE(r.out.find("interrupted: played "), std::string::npos) << r.out;
+    EXPECT_EQ(r.out.find(" 0 dropped"), std::string::npos) << r.out;
 }
 
 TEST(KovaPlay, WithoutDeviceOrCaptureFailsClearly) {
@@ -40,6 +82,21 @@ TEST(KovaPlay, WithoutDeviceOrCaptureFailsClearly) {
     EXPECT_EQ(count_lines(r.err), 1) << r.err;
     EXPECT_NE(r.err.find("no sound device"), std::string::npos) << r.err;
     EXPECT_NE(r.err.find("--capture"), std::string::npos) << r.err;
+}
+
+/* On a terminal the status line shows progress as a bar against the total, the ring's fill in ms,
+ * the blocks dropped and the underruns. */
+TEST(KovaPlay, StatusLineOnATerminal) {
+    TempDir dir;
+    const RunResult r =
+        run_kova({"play", "--gesture", "fast", "--device", kNoDevice, "--capture", "cap.wav"},
+                 dir.path(), 0, {}, true);
+    ASSERT_EQ(r.code, 0) << r.err;
+    for (const std::string& part :
+         std::vector<std::string>{"[" + std::string(24, '#') + "] ", " / 0.31 s   ring ",
+                                  " ms   dropped 0   underruns 0"})
+        EXPECT_NE(r.err.find(part), std::string::npos) << r.err;
+    EXPECT_NE(r.err.find("] "), r.err.rfind("] ")) << "refreshed while it plays";
 }
 
 /* ALSA's "null" device takes samples and discards them; it exists wherever ALSA's configuration

@@ -1,9 +1,11 @@
 /* kova render: the WAV file read back with libsndfile, the PNG read back with cairo. */
 #include <cairo.h>
+#include <sndfile.h>
 #include <gtest/gtest.h>
 
 #include <cmath>
 #include <cstdint>
+#include <map>
 #include <set>
 #include <sstream>
 
@@ -13,7 +15,7 @@ namespace kova_test {
 namespace {
 
 /* Lengths of the built-in start and end sounds, as documented. */
-constexpr int kStartMs = 80;
+constexpr int kStartMs = 40;
 constexpr int kEndMs = 120;
 
 /* Two strokes of 1 px/ms with a pause: down at 0, a move every 10 ms to 500, up at 510; down
@@ -116,36 +118,52 @@ TEST(KovaRenderDefaults, LengthFollowsTheBuiltInGesture) {
     }
     EXPECT_EQ(strokes, 3);
     EXPECT_EQ(w.frames(), cursor);
+    // Loud enough to hear next to other sounds, with headroom: a peak of -6 to -1 dBFS.
+    EXPECT_GE(peak(w, 0, w.frames()), 16423);
+    EXPECT_LE(peak(w, 0, w.frames()), 29205);
     ASSERT_EQ(pauses.size(), 2u);
     for (size_t p = 0; p < pauses.size(); ++p) {
         EXPECT_EQ(peak(w, pauses[p], pauses[p] + 4800), 0) << "pause " << p;
     }
 }
 
-TEST(KovaRenderFiles, LoopFromPcmFileKeepsItsPitch) {
-    TempDir dir;
-    // One second of a 440 Hz tone, stereo at 48000 Hz, as the loop.
-    std::string raw;
-    for (int i = 0; i < 48000; ++i) {
-        const auto v = static_cast<int16_t>(3000.0 * std::sin(2.0 * M_PI * 440.0 * i / 48000.0));
-        for (int c = 0; c < 2; ++c) raw.append(reinterpret_cast<const char*>(&v), 2);
-    }
-    write_file(dir.file("tone.raw"), raw);
-    write_file(dir.file("g.csv"), two_strokes_csv());
-    const RunResult r =
-        run_kova({"render", "--loop", "tone.raw", "--gesture", "g.csv", "-o", "t.wav"}, dir.path());
-    ASSERT_EQ(r.code, 0) << r.err;
-    const Wav w = read_wav(dir.file("t.wav"));
-    // No start sound: the first stroke's moves begin the file.
-    const size_t first = 0, last = 50 * 480;
-    ASSERT_GE(w.frames(), last);
+/* Frequency of channel 0 over the first moves of the first stroke, by zero crossings. */
+double loop_hz(const Wav& w) {
+    const size_t last = 50 * 480;
     int crossings = 0;
-    for (size_t i = first + 1; i < last; ++i) {
-        const int a = w.samples[(i - 1) * 2], b = w.samples[i * 2];
+    for (size_t i = 1; i < std::min(last, w.frames()); ++i) {
+        const int a = w.samples[(i - 1) * w.channels], b = w.samples[i * w.channels];
         if ((a < 0) != (b < 0)) ++crossings;
     }
-    const double hz = crossings / 2.0 / ((last - first) / 48000.0);
-    EXPECT_NEAR(hz, 440.0, 440.0 * 0.03);
+    return crossings / 2.0 / (last / 48000.0);
+}
+
+/* Loops from sound files: raw PCM as it is, a WAV in the engine's format exactly as its samples,
+ * and other formats converted (rate, channels, sample type) so the tone keeps its pitch. */
+TEST(KovaRenderFiles, SoundFilesKeepTheirSamplesOrTheirPitch) {
+    TempDir dir;
+    write_file(dir.file("g.csv"), two_strokes_csv());
+    write_tone(dir.file("tone.wav"), SF_FORMAT_WAV | SF_FORMAT_PCM_16, 48000, 2, 1.0);
+    write_tone(dir.file("tone.flac"), SF_FORMAT_FLAC | SF_FORMAT_PCM_24, 44100, 1, 1.0);
+    write_tone(dir.file("tone.ogg"), SF_FORMAT_OGG | SF_FORMAT_VORBIS, 22050, 2, 1.0);
+    const Wav wav = read_wav(dir.file("tone.wav"));
+    write_file(dir.file("tone.raw"), std::string(reinterpret_cast<const char*>(wav.samples.data()),
+                                                 wav.samples.size() * 2));
+    std::map<std::string, std::string> rendered;
+    for (const char* loop : {"tone.raw", "tone.wav", "tone.flac", "tone.ogg"}) {
+        SCOPED_TRACE(loop);
+        const std::string out = std::string(loop) + ".out.wav";
+        const RunResult r =
+            run_kova({"render", "--loop", loop, "--gesture", "g.csv", "-o", out}, dir.path());
+        ASSERT_EQ(r.code, 0) << r.err;
+        const bool converted = std::string(loop).find(".wav") == std::string::npos &&
+                               std::string(loop).find(".raw") == std::string::npos;
+        EXPECT_EQ(r.err.find("kova: note: converted loop sound") != std::string::npos, converted)
+            << r.err;
+        EXPECT_NEAR(loop_hz(read_wav(dir.file(out))), 440.0, 440.0 * 0.03);
+        rendered[loop] = read_file(dir.file(out));
+    }
+    EXPECT_EQ(rendered["tone.wav"], rendered["tone.raw"]);
 }
 
 TEST(KovaRenderPicture, PngHasTheRequestedSizeAndShowsTheSound) {

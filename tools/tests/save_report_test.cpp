@@ -3,14 +3,15 @@
 
 #include <sstream>
 
-#include "support/json_read.h"
+#include <nlohmann/json.hpp>
+#include <sndfile.h>
 #include "support/tool_run.h"
 
 namespace kova_test {
 namespace {
 
-/* Built-in start (80 ms) and end (120 ms) sounds and a noise loop (1 s) at 48000 Hz stereo. */
-constexpr int kStartBytes = 80 * 192;
+/* Built-in start (40 ms) and end (120 ms) sounds and a noise loop (1 s) at 48000 Hz stereo. */
+constexpr int kStartBytes = 40 * 192;
 constexpr int kLoopBytes = 192000;
 constexpr int kEndBytes = 120 * 192;
 /* Record sizes of the file layout: count, filter, tune set, slot table, source record. */
@@ -25,13 +26,15 @@ const std::vector<std::string> kSaveArgs = {
     "--end-gain",  "0.7",          "--repeat",    "loop=100:900"};
 
 /* The object's fields named in `keys` (separated by spaces) hold `values`, in that order. */
+using Json = nlohmann::json;
+
 void expect_numbers(const Json& object, const std::string& keys,
                     const std::vector<double>& values) {
     std::istringstream names(keys);
     std::string key;
     for (double value : values) {
         ASSERT_TRUE(names >> key);
-        EXPECT_EQ(object[key].n, value) << key;
+        EXPECT_EQ(object.value(key, -1.0), value) << key;
     }
     EXPECT_FALSE(names >> key) << "no value for " << key;
 }
@@ -42,23 +45,22 @@ TEST(KovaSaveInspect, JsonShowsWhatWasSaved) {
     ASSERT_EQ(r.code, 0) << r.err;
     r = run_kova({"inspect", "--json", "set.kset"}, dir.path());
     ASSERT_EQ(r.code, 0) << r.err;
-    Json j;
-    ASSERT_TRUE(parse_json(r.out, j)) << r.out;
+    const Json j = Json::parse(r.out);
 
     const int first = kCount + 2 * kFilter + kTune + kInfo + kRecord;
     const int loop_at = first + kStartBytes + kRecord, end_at = loop_at + kLoopBytes + kRecord;
     const Json& slots = j["slots"];
-    expect_numbers(slots["start"], "offset size length_ms", {first, kStartBytes, 80});
+    expect_numbers(slots["start"], "offset size length_ms", {first, kStartBytes, 40});
     expect_numbers(slots["loop"], "offset size length_ms repeat_start_ms repeat_end_ms",
                    {loop_at, kLoopBytes, 1000, 100, 900});
     expect_numbers(slots["end"], "offset size repeat_end_ms", {end_at, kEndBytes, 120});
     EXPECT_EQ(file_size(dir.file("set.kset")), end_at + kEndBytes);
 
     const Json& filters = j["filters"];
-    ASSERT_EQ(filters.items.size(), 2u);
-    EXPECT_EQ(filters[0]["type"].s, "lowpass");
-    EXPECT_EQ(filters[0]["freq"].n, 6000);
-    EXPECT_EQ(filters[1]["type"].s, "bandpass");
+    ASSERT_EQ(filters.size(), 2u);
+    EXPECT_EQ(filters[0]["type"], "lowpass");
+    EXPECT_EQ(filters[0]["freq"], 6000);
+    EXPECT_EQ(filters[1]["type"], "bandpass");
     expect_numbers(filters[1], "freq bandwidth enable samplerate channels",
                    {2000, 1000, 1, 48000, 2});
     // Read back, a noise level lives in file_gain: the saved set plays its loop as loud.
@@ -100,12 +102,18 @@ TEST(KovaSaveInspect, SavedSetRendersAndSavingReplacesALongerFile) {
                  dir.path());
     ASSERT_EQ(r.code, 0) << r.err;
     r = run_kova({"inspect", "--json", "again.kset"}, dir.path());
-    Json j;
-    ASSERT_TRUE(parse_json(r.out, j)) << r.out;
-    EXPECT_EQ(j["slots"]["end"]["size"].n, 960);
-    EXPECT_EQ(j["slots"]["start"]["size"].n, kStartBytes);
-    EXPECT_EQ(j["tune"]["gain"].n, 0.7);
-    EXPECT_EQ(j["tune"]["file_gain"].n, 0.6);
+    Json j = Json::parse(r.out);
+    EXPECT_EQ(j["slots"]["end"]["size"], 960);
+    EXPECT_EQ(j["slots"]["start"]["size"], kStartBytes);
+    EXPECT_EQ(j["tune"]["gain"], 0.7);
+    EXPECT_EQ(j["tune"]["file_gain"], 0.6);
+
+    // A loop from a mono 24 kHz WAV is stored converted: 0.5 s at 48 kHz stereo.
+    write_tone(dir.file("tone.wav"), SF_FORMAT_WAV | SF_FORMAT_PCM_16, 24000, 1, 0.5);
+    r = run_kova({"save", "--set", "set.kset", "--loop", "tone.wav", "-o", "wav.kset"}, dir.path());
+    ASSERT_EQ(r.code, 0) << r.err;
+    j = Json::parse(run_kova({"inspect", "--json", "wav.kset"}, dir.path()).out);
+    EXPECT_NEAR(j["slots"]["loop"]["size"].get<double>(), 96000, 16);
 }
 
 TEST(KovaSaveInspect, InspectRefusesFilesThatAreNoSourceSet) {

@@ -3,7 +3,8 @@
  * The selection applies to tracks created after the call; tracks already open keep their sink.
  * Two sinks come with the library:
  *   - capture: keeps every byte the "device" received, in order, across all tracks, until cleared;
- *   - null (the default): discards.
+ *   - null (the default): discards;
+ *   - stall: discards, but every burst write blocks first, like a device that stopped draining.
  * The counters cover every track of the process since start-up (or the last reset). */
 #ifndef KOVA_HOST_AUDIO_SINK_H
 #define KOVA_HOST_AUDIO_SINK_H
@@ -17,6 +18,14 @@ extern "C" {
 
 void kova_host_use_capture_sink(void);
 void kova_host_use_null_sink(void);
+/* Tracks created from now on get a sink whose every burst write blocks for `stall_ms`
+ * milliseconds before discarding the burst. 0 means no stall: the same as the null sink. */
+void kova_host_use_stall_sink(uint32_t stall_ms);
+
+/* Released tracks whose callback thread is still held up by its sink. Releasing a track waits
+ * only a short time (100 ms) for its thread; a thread still busy after that ends on its own,
+ * without calling the callback again. Tests poll this to finish with no such thread left. */
+size_t kova_host_lingering_tracks(void);
 
 /* The captured bytes: their count, a copy of the first min(size, cap) of them (returns the count
  * copied), and emptying the store. */
@@ -57,8 +66,8 @@ namespace kova_host {
 
 /* A device end for the callback thread. All three methods are called on the track's callback
  * thread only (start when playback begins, write per burst, stop when it ends), never
- * concurrently for one sink; the sink is created when the track is created and destroyed after
- * its thread has been joined. */
+ * concurrently for one sink; the sink is created when the track is created and destroyed on that
+ * thread as it ends, which may be after the track itself was released. */
 class AudioSink {
    public:
     virtual ~AudioSink() = default;

@@ -4,7 +4,8 @@
  * burst (4 ms of audio, 192 frames at 48000 Hz) on absolute deadlines, like a device pulling at its
  * real pace, and hands exactly the bytes it got back to the selected sink (see
  * kova_host/audio_sink.h). A shorter answer is an underrun and is counted; nothing is padded.
- * Releasing the last strong reference stops the thread and joins it. */
+ * Releasing the last strong reference stops the thread and waits a short, bounded time for it (see
+ * host/track_thread.h); the callback is never called again once the release returns. */
 #ifndef KOVA_HOST_MEDIA_AUDIOTRACK_H
 #define KOVA_HOST_MEDIA_AUDIOTRACK_H
 
@@ -78,7 +79,7 @@ class AudioTrack : public virtual RefBase {
     void flush();
 
    protected:
-    /* Stops and joins the callback thread; runs when the last strong reference goes. */
+    /* Stops the callback thread (bounded wait); runs when the last strong reference goes. */
     ~AudioTrack() override;
 
    private:

@@ -10,6 +10,8 @@
 #include <unistd.h>
 
 #include <cmath>
+#include <csignal>
+#include <ctime>
 #include <cstdlib>
 #include <fstream>
 #include <sstream>
@@ -18,7 +20,33 @@ extern char** environ;
 
 namespace kova_test {
 
-RunResult run_kova(const std::vector<std::string>& args, const std::string& dir) {
+namespace {
+
+int64_t now_ms() {
+    timespec t{};
+    clock_gettime(CLOCK_MONOTONIC, &t);
+    return t.tv_sec * 1000LL + t.tv_nsec / 1000000;
+}
+
+/* Waits for `pid`, sending SIGINT at `sigint_at` (monotonic ms, 0: never); returns the status and
+ * the time from the signal to the exit. */
+int wait_child(pid_t pid, int64_t sigint_at, int64_t& exit_ms) {
+    int status = 0;
+    int64_t sent = 0;
+    while (waitpid(pid, &status, sigint_at ? WNOHANG : 0) == 0) {
+        const int64_t now = now_ms();
+        if (!sent && now >= sigint_at) kill(pid, SIGINT), sent = now;
+        if (sent && now - sent > 10000) kill(pid, SIGKILL);
+        usleep(5000);
+    }
+    if (sent) exit_ms = now_ms() - sent;
+    return status;
+}
+
+}  // namespace
+
+RunResult run_kova(const std::vector<std::string>& args, const std::string& dir,
+                   int sigint_after_ms, const std::vector<std::string>& env, bool stderr_tty) {
     const std::string out_path = dir + "/.stdout";
     const std::string err_path = dir + "/.stderr";
     std::vector<std::string> argv_store{KOVA_TOOL_BINARY};
@@ -31,21 +59,36 @@ RunResult run_kova(const std::vector<std::string>& args, const std::string& dir)
     posix_spawn_file_actions_init(&fa);
     posix_spawn_file_actions_addopen(&fa, 0, "/dev/null", O_RDONLY, 0);
     posix_spawn_file_actions_addopen(&fa, 1, out_path.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
-    posix_spawn_file_actions_addopen(&fa, 2, err_path.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
+    const int pty = stderr_tty ? posix_openpt(O_RDWR | O_NOCTTY) : -1;
+    if (pty >= 0 && grantpt(pty) == 0 && unlockpt(pty) == 0) {
+        posix_spawn_file_actions_addopen(&fa, 2, ptsname(pty), O_WRONLY | O_NOCTTY, 0);
+    } else {
+        posix_spawn_file_actions_addopen(&fa, 2, err_path.c_str(), O_WRONLY | O_CREAT | O_TRUNC,
+                                         0644);
+    }
     posix_spawn_file_actions_addchdir_np(&fa, dir.c_str());
+    std::vector<std::string> env_store(env);
+    for (char** e = environ; *e; ++e) env_store.emplace_back(*e);
+    std::vector<char*> envp;
+    for (std::string& e : env_store) envp.push_back(e.data());
+    envp.push_back(nullptr);
     pid_t pid = -1;
     RunResult r;
-    const int rc = posix_spawn(&pid, argv[0], &fa, nullptr, argv.data(), environ);
+    const int64_t start = now_ms();
+    const int rc = posix_spawn(&pid, argv[0], &fa, nullptr, argv.data(), envp.data());
     posix_spawn_file_actions_destroy(&fa);
     if (rc != 0) {
         ADD_FAILURE() << "cannot start " << argv[0];
         return r;
     }
-    int status = 0;
-    waitpid(pid, &status, 0);
+    const int status = wait_child(pid, sigint_after_ms ? start + sigint_after_ms : 0, r.exit_ms);
     if (WIFEXITED(status)) r.code = WEXITSTATUS(status);
     r.out = read_file(out_path);
     r.err = read_file(err_path);
+    // What the terminal got stays readable after the child closed its side.
+    char buf[4096];
+    for (ssize_t n; pty >= 0 && (n = read(pty, buf, sizeof buf)) > 0;) r.err.append(buf, n);
+    if (pty >= 0) close(pty);
     unlink(out_path.c_str());
     unlink(err_path.c_str());
     return r;
@@ -101,6 +144,21 @@ int count_lines(const std::string& text) {
         if (!line.empty()) ++n;
     }
     return n;
+}
+
+void write_tone(const std::string& path, int format, int rate, int channels, double seconds) {
+    SF_INFO info{};
+    info.samplerate = rate;
+    info.channels = channels;
+    info.format = format;
+    SNDFILE* f = sf_open(path.c_str(), SFM_WRITE, &info);
+    ASSERT_NE(f, nullptr) << sf_strerror(nullptr);
+    std::vector<float> pcm;
+    for (int i = 0; i < static_cast<int>(seconds * rate); ++i)
+        pcm.insert(pcm.end(), channels,
+                   0.1f * static_cast<float>(std::sin(2 * M_PI * 440.0 * i / rate)));
+    sf_writef_float(f, pcm.data(), static_cast<sf_count_t>(pcm.size() / channels));
+    sf_close(f);
 }
 
 Wav read_wav(const std::string& path) {

@@ -12,10 +12,15 @@ struct RunResult {
     int code = -1; /* exit code; -1 when the process did not exit normally */
     std::string out;
     std::string err;
+    int64_t exit_ms = -1; /* from the signal to the exit, when a signal was sent */
 };
 
-/* Runs the kova binary with `args` in `dir`, standard input closed. */
-RunResult run_kova(const std::vector<std::string>& args, const std::string& dir);
+/* Runs the kova binary with `args` in `dir`, standard input closed, with `env` ("NAME=value")
+ * added to the environment. With `sigint_after_ms`, sends SIGINT that long after the start (and
+ * SIGKILL 10 s later should it still run). With `stderr_tty`, standard error is a terminal. */
+RunResult run_kova(const std::vector<std::string>& args, const std::string& dir,
+                   int sigint_after_ms = 0, const std::vector<std::string>& env = {},
+                   bool stderr_tty = false);
 
 /* A fresh folder under the system temporary folder, removed with its files. */
 class TempDir {
@@ -45,6 +50,8 @@ struct Wav {
     size_t frames() const { return channels ? samples.size() / channels : 0; }
 };
 
+/* Writes `seconds` of a 440 Hz tone at 0.1 of full scale with libsndfile in `format`. */
+void write_tone(const std::string& path, int format, int rate, int channels, double seconds);
 /* Reads a WAV file with libsndfile; a file it cannot open fails the calling test. */
 Wav read_wav(const std::string& path);
 /* Root mean square of channel 0..channels-1 together, over frames [first, last). */
