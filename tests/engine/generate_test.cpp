@@ -338,16 +338,10 @@ TEST_F(GenTest, RefusalsChangeNothing) {
         EXPECT_EQ(kova_gen_sounds(c, p, o), 0);
         EXPECT_EQ(kova_gen_samples(c, p, o), 0);
     };
-    refused(nullptr, &good, &out);
-    refused(ctx.get(), nullptr, &out);
-    refused(ctx.get(), &good, nullptr);
-    const KOVA_PARAM bad[] = {event(-1, 140, 1032, 1), event(170, -0.5f, 1032, 1),
-                              event(170, 140, -1, 1), event(170, 140, 1032, 3),
-                              event(-INFINITY, 140, 1032, 1)};
-    for (const KOVA_PARAM& p : bad) refused(ctx.get(), &p, &out);
-    KOVA_PCMBUF empty{small.data(), 0}, nodata{nullptr, 128};
-    refused(ctx.get(), &good, &empty);
-    refused(ctx.get(), &good, &nodata);
+    // Null, dead and out-of-range arguments are rows of the contract table; here the states of a
+    // live context that cannot play.
+    const KOVA_PARAM far_left = event(-INFINITY, 140, 1032, 1);
+    refused(ctx.get(), &far_left, &out);
     for (int32_t active : {0, 2, -1}) {
         ctx->active_src = active;
         refused(ctx.get(), &good, &out);
@@ -357,9 +351,6 @@ TEST_F(GenTest, RefusalsChangeNothing) {
     set->src[KOVA_SLOT_LOOP] = nullptr;  // a set without a loop source
     refused(ctx.get(), &good, &out);
     set->src[KOVA_SLOT_LOOP] = saved;
-    ctx->tag = 0;
-    refused(ctx.get(), &good, &out);
-    ctx->tag = KOVA_CTX_TAG;
 
     EXPECT_EQ(ctx->stroke, before.stroke);
     EXPECT_EQ(ctx->prev_env, before.prev_env);
