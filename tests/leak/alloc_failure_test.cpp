@@ -165,6 +165,14 @@ bool one_of(int v, std::initializer_list<int> codes) {
     return false;
 }
 
+// A constructor's result: released when it was made, else `err` holds a documented code. (`err`
+// by reference: it is read only after the constructor ran.)
+template <typename T, typename Release>
+bool made_or(T* made, Release release, const int32_t& err, std::initializer_list<int> codes) {
+    if (made != nullptr) return release(made) != KOVA_OK;
+    return one_of(err, codes);
+}
+
 class AllocFailure : public testing::Test {
    protected:
     void SetUp() override {
@@ -252,9 +260,8 @@ TEST_F(AllocFailure, EveryOperationReportsReleasesAndKeepsWhatExisted) {
     const Op ops[] = {
         {"kova_init",
          [&](long n) {
-             KOVA_CTX* ctx = failing_at(n, [&] { return kova_init(&kPhone, &err); });
-             if (ctx != nullptr) return kova_deinit(ctx) != KOVA_OK;
-             return one_of(err, {KOVA_ERR_INSUFF_MEM});
+             return made_or(failing_at(n, [&] { return kova_init(&kPhone, &err); }), kova_deinit,
+                            err, {KOVA_ERR_INSUFF_MEM});
          },
          "KOVA_CTX malloc fail \nkova_init() fail. err code (-2) \n", 8},
         {"register files",
@@ -347,9 +354,8 @@ TEST_F(AllocFailure, EveryOperationReportsReleasesAndKeepsWhatExisted) {
          }},
         {"filter",
          [&](long n) {
-             KOVA_FLT* f = failing_at(n, [&] { return kova_flt_init(&kBandpass, &err); });
-             if (f != nullptr) return kova_flt_deinit(f) != KOVA_OK;
-             return one_of(err, {KOVA_ERR_INSUFF_MEM});
+             return made_or(failing_at(n, [&] { return kova_flt_init(&kBandpass, &err); }),
+                            kova_flt_deinit, err, {KOVA_ERR_INSUFF_MEM});
          },
          "KOVA_CTX malloc fail \nkova_flt_init() fail. err code (-2) \n", 7},
         {"oscillator",
