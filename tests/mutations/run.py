@@ -2,7 +2,7 @@
 """Mutation check: applies each mutation of mutations.txt in turn to a scratch copy of the
 checkout, builds, runs the test suites and reports which tests caught it. By hand, not in CI:
 
-    tests/mutations/run.py [--build DIR] [--only M03,M07] [--jobs N] [--head]
+    tests/mutations/run.py [--build DIR] [--only M03,M07] [--jobs N] [--head] [--first]
 
 A mutation that no test catches is reported as SURVIVED, one whose text is no longer in the code
 as STALE, one that does not compile as INVALID; any of these makes the script exit 1. The scratch
@@ -106,6 +106,9 @@ def main():
     ap.add_argument("--build", default="/tmp/kova-mutations")
     ap.add_argument("--only", default="")
     ap.add_argument("--jobs", default=str(os.cpu_count() or 2))
+    ap.add_argument("--first", action="store_true",
+                    help="stop each mutation's test run at the first failure (faster; names one "
+                         "catching test; a hang then costs one timeout)")
     ap.add_argument("--head", action="store_true",
                     help="check the last commit, not the files on disk")
     args = ap.parse_args()
@@ -171,7 +174,8 @@ def main():
                 if os.path.exists(failed_log):
                     os.remove(failed_log)
                 # A minute is ample for any suite; a hang (a missed unlock) times out.
-                rc = run(["ctest", "-j", args.jobs, "--timeout", "60"], build, log)
+                rc = run(["ctest", "-j", args.jobs, "--timeout", "60"] +
+                         (["--stop-on-failure"] if args.first else []), build, log)
                 if os.path.exists(failed_log):
                     caught = [l.split(":", 1)[1].strip() for l in open(failed_log) if ":" in l]
                 if rc and caught:
