@@ -379,6 +379,10 @@ TEST_F(JavaContract, MethodsRefuseIdsWithoutInstanceOrContext) {
     inst->pCtx = ctx;
     EXPECT_EQ(counters().arrays_got, counters().arrays_released);
     EXPECT_EQ(out.items, std::vector<jbyte>(64, 0x5a));
+
+    // The last slot's id names an instance like any other.
+    for (jlong id = 2; id <= KOVA_MAX_INSTANCES; ++id) ASSERT_EQ(jni_test::init_default(), id);
+    EXPECT_EQ(Java_com_corvane_audio_Kova_set_1volume(env(), nullptr, KOVA_MAX_INSTANCES, 0.5), 0);
 }
 
 }  // namespace
