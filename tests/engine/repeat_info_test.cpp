@@ -65,6 +65,9 @@ TEST(RepeatInfo, StoringKeepsValuesWithinTheSource) {
     EXPECT_EQ(s->rpt_end, 8820);  // equal to the length: the whole source
     EXPECT_EQ(l->rpt_start, 17640);
     EXPECT_EQ(l->rpt_end, 0);  // 0 ms stores 0 bytes, also for the loop slot
+    in = KOVA_RPT_INFO{{0, 0, 0}, {51, -1, -1}, {-1, -1, -1}};
+    ASSERT_EQ(kova_set_rptinfo(ctx, 1, &in), 0);
+    EXPECT_EQ(s->rpt_start, 0);  // 51 ms > 50 ms length: unchanged
 
     KOVA_RPT_INFO out{};
     ASSERT_EQ(kova_get_rptinfo(ctx, 1, &out), 0);
