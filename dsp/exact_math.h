@@ -1,21 +1,11 @@
 // SPDX-License-Identifier: Apache-2.0
 /* Arithmetic helpers shared by the signal blocks, where outputs must be bit-exact on every target.
- *
- * Include this header LAST in a source file: the pragma below applies to every function defined
- * after it, and standard headers should keep their own settings. */
+ * Multiply-adds stay unfused because the whole library is built with -ffp-contract=off (see
+ * CMakeLists.txt): a*b + c must round twice, as written. */
 #ifndef KOVA_DSP_EXACT_MATH_H
 #define KOVA_DSP_EXACT_MATH_H
 
 #include <cstdint>
-
-/* No fused multiply-add: a*b + c must round twice, as written, or the filter, equaliser and
- * oscillator outputs change in their last bits (clang contracts within expressions by default,
- * GCC across them on AArch64). */
-#if defined(__clang__)
-#pragma STDC FP_CONTRACT OFF
-#elif defined(__GNUC__)
-#pragma GCC optimize("fp-contract=off")
-#endif
 
 namespace kova::dsp {
 

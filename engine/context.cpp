@@ -5,7 +5,7 @@
 #include <cstdio>
 #include <pthread.h>
 
-#include "engine/engine_internal.h"
+#include "engine/context_access.h"
 #include "kova/kova_dsp.h"
 #include "kova/kova_engine.h"
 #include "kova/kova_list.h"

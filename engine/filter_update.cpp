@@ -6,16 +6,14 @@
 #include <cstring>
 #include <memory>
 
-#include "engine/engine_internal.h"
+#include "engine/srcset_build.h"
 #include "kova/kova_dsp.h"
 #include "kova/kova_engine.h"
 #include "kova/kova_source.h"
+#include "source/filter_dsc.h"
 #include "util/kova_mem.h"
 
 namespace {
-
-// Highest descriptor rate taken; well above any PCM rate this library handles.
-constexpr int32_t kMaxFilterRate = 384000;
 
 struct MemFree {
     void operator()(char* p) const { kova_mem_free(p); }
@@ -43,7 +41,9 @@ int32_t edit_filters(KOVA_CTX* ctx, int32_t index, const KOVA_FLT_DSC* dsc, int3
                      bool attach) {
     if (err == nullptr) return 0;
     *err = KOVA_ERR_INVALID_PARAM;
-    if (!_ctx_alive(ctx) || !_srcset_index_ok(ctx, index) || !_flt_dsc_usable(dsc)) return 0;
+    if (!_ctx_alive(ctx) || !_srcset_index_ok(ctx, index) ||
+        !kova_source::filter_dsc_ok(dsc, kova_source::FilterUse::kDesign))
+        return 0;
 
     KovaCtxLock lock(ctx);
     KOVA_SRCSET* set = _fetch_srcset(ctx, index);
@@ -84,23 +84,6 @@ int32_t edit_filters(KOVA_CTX* ctx, int32_t index, const KOVA_FLT_DSC* dsc, int3
 }
 
 }  // namespace
-
-// Besides the type code, a descriptor must describe a filter whose design stays finite and
-// stable: a positive rate, a frequency strictly between 0 and Nyquist (tan(pi*f/fs) is 0 or
-// infinite at the ends), for the band types also such a bandwidth, one or two channels, no NaN or
-// infinity anywhere. The bandwidth of low- and high-pass filters is unused and only has to be
-// finite.
-bool _flt_dsc_usable(const KOVA_FLT_DSC* dsc) {
-    if (dsc == nullptr || kova_is_valid_filter(dsc) != 1) return false;
-    if (dsc->samplerate <= 0 || dsc->samplerate > kMaxFilterRate) return false;
-    if (dsc->channels < 1 || dsc->channels > 2) return false;
-    if (!std::isfinite(dsc->freq) || !std::isfinite(dsc->bandwidth)) return false;
-    const double nyquist = dsc->samplerate / 2.0;
-    if (!(dsc->freq > 0.0 && dsc->freq < nyquist)) return false;
-    const bool band = dsc->type == KOVA_FLT_BANDPASS || dsc->type == KOVA_FLT_BANDREJECT;
-    if (band && !(dsc->bandwidth > 0.0 && dsc->bandwidth < nyquist)) return false;
-    return true;
-}
 
 bool _flt_list_push_copy(LIST* filters, const KOVA_FLT_DSC* dsc) {
     auto* copy = static_cast<KOVA_FLT_DSC*>(kova_mem_malloc(sizeof(KOVA_FLT_DSC)));

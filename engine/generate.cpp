@@ -3,9 +3,9 @@
 #include <cmath>
 #include <cstdint>
 
-#include "engine/engine_internal.h"
+#include "engine/context_access.h"
 #include "kova/kova_engine.h"
-#include "engine/generate_finish.h"
+#include "engine/sample_kernel.h"
 
 int16_t clip_count_hi = 0;
 int16_t clip_count_lo = 0;
@@ -38,14 +38,18 @@ KOVA_SRCSET* playable_set(const KOVA_CTX* ctx) {
     return set;
 }
 
-bool request_ok(const KOVA_CTX* ctx, const KOVA_PARAM* param, const KOVA_PCMBUF* out) {
-    return event_ok(param) && out != nullptr && out->data != nullptr && out->size >= 1 &&
-           playable_set(ctx) != nullptr;
+// The set a request plays from: a usable event, an output buffer with room and a context that can
+// generate. Null refuses the request. Each entry point checks its request here once.
+KOVA_SRCSET* checked_request(const KOVA_CTX* ctx, const KOVA_PARAM* param, const KOVA_PCMBUF* out) {
+    if (!event_ok(param) || out == nullptr || out->data == nullptr || out->size < 1) {
+        return nullptr;
+    }
+    return playable_set(ctx);
 }
 
-GenBlock setup_block(const KOVA_CTX* ctx, const KOVA_PARAM* param) {
+GenBlock setup_block(const KOVA_CTX* ctx, KOVA_SRCSET* set, const KOVA_PARAM* param) {
     GenBlock b{};
-    b.set = playable_set(ctx);
+    b.set = set;
     b.tune = b.set->tune;
     b.loop = b.set->src[KOVA_SLOT_LOOP];
     const int32_t origin = b.loop->origin;
@@ -78,6 +82,19 @@ int32_t gen_once(KOVA_CTX* ctx, bool is_end, KOVA_PCMBUF* out, const GenBlock& b
     return n;
 }
 
+// The samples of one checked request's action.
+int32_t gen_action(KOVA_CTX* ctx, KOVA_SRCSET* set, const KOVA_PARAM* param, KOVA_PCMBUF* out) {
+    const GenBlock b = setup_block(ctx, set, param);
+    switch (param->action) {
+        case KOVA_ACTION_START:
+            return gen_once(ctx, false, out, b);
+        case KOVA_ACTION_END:
+            return gen_once(ctx, true, out, b);
+        default:
+            return kova_gen::gen_move(ctx, param, out, b);
+    }
+}
+
 }  // namespace
 
 extern "C" {
@@ -94,20 +111,13 @@ KOVA_API void kova_set_param(KOVA_PARAM* dst, const KOVA_PARAM* src) {
 // Checks everything itself as well (it is exported): a request that kova_gen_sounds would
 // refuse produces nothing here either.
 KOVA_API int32_t kova_gen_samples(KOVA_CTX* ctx, const KOVA_PARAM* param, KOVA_PCMBUF* out) {
-    if (!request_ok(ctx, param, out)) return 0;
-    const GenBlock b = setup_block(ctx, param);
-    switch (param->action) {
-        case KOVA_ACTION_START:
-            return gen_once(ctx, false, out, b);
-        case KOVA_ACTION_END:
-            return gen_once(ctx, true, out, b);
-        default:
-            return kova_gen::gen_move(ctx, param, out, b);
-    }
+    KOVA_SRCSET* set = checked_request(ctx, param, out);
+    return set != nullptr ? gen_action(ctx, set, param, out) : 0;
 }
 
 KOVA_API int32_t kova_gen_sounds(KOVA_CTX* ctx, const KOVA_PARAM* param, KOVA_PCMBUF* out) {
-    if (!request_ok(ctx, param, out)) return 0;
+    KOVA_SRCSET* set = checked_request(ctx, param, out);
+    if (set == nullptr) return 0;
     int32_t samples = 0;
     switch (param->action) {
         case KOVA_ACTION_START:
@@ -116,17 +126,17 @@ KOVA_API int32_t kova_gen_sounds(KOVA_CTX* ctx, const KOVA_PARAM* param, KOVA_PC
             ctx->prev_env = 1.0;
             ctx->slew_odd = 0;
             ctx->slew_even = 0;
-            samples = kova_gen_samples(ctx, param, out);
+            samples = gen_action(ctx, set, param, out);
             break;
         case KOVA_ACTION_MOVE:
             // A move outside a stroke only opens one; its position becomes the reference.
-            if (ctx->stroke == 1) samples = kova_gen_samples(ctx, param, out);
+            if (ctx->stroke == 1) samples = gen_action(ctx, set, param, out);
             kova_set_param(ctx->prev_param, param);
             ctx->stroke = 1;
             break;
         default:
             ctx->stroke = 0;
-            samples = kova_gen_samples(ctx, param, out);
+            samples = gen_action(ctx, set, param, out);
             break;
     }
     return samples > 0 ? 2 * samples : 0;

@@ -7,7 +7,7 @@
 
 #include "kova/kova_dsp.h"
 #include "dsp/dsp_internal.h"
-#include "engine/generate_finish.h"
+#include "engine/sample_kernel.h"
 
 namespace kova_gen {
 namespace {

@@ -5,7 +5,7 @@
 #include <cstdint>
 
 #include "kova/kova_engine.h"
-#include "engine/generate_finish.h"
+#include "engine/sample_kernel.h"
 #include "dsp/dsp_internal.h"
 
 namespace {

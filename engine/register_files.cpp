@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // Registration of a source set from raw PCM files, selection of the active set, set count.
-#include "engine/engine_internal.h"
+#include "engine/srcset_build.h"
 #include "kova/kova_dsp.h"
 #include "kova/kova_engine.h"
 #include "kova/kova_source.h"

@@ -1,9 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
 // Registration of a source set whose loop sound is white noise shaped by one filter.
-#include "engine/engine_internal.h"
+#include "engine/srcset_build.h"
 #include "kova/kova_dsp.h"
 #include "kova/kova_engine.h"
 #include "kova/kova_source.h"
+#include "source/filter_dsc.h"
 
 extern "C" KOVA_API int32_t kova_reg_src_byfilter(KOVA_CTX* ctx, const KOVA_FLT_DSC* dsc,
                                                   int32_t* err) {
@@ -11,7 +12,8 @@ extern "C" KOVA_API int32_t kova_reg_src_byfilter(KOVA_CTX* ctx, const KOVA_FLT_
     *err = KOVA_ERR_INVALID_PARAM;
     // Degenerate descriptors (no rate, frequencies at or past Nyquist, NaN, ...) would design
     // infinite or unstable coefficients; they are refused here, before anything is built.
-    if (!_ctx_alive(ctx) || !_flt_dsc_usable(dsc)) return 0;
+    if (!_ctx_alive(ctx) || !kova_source::filter_dsc_ok(dsc, kova_source::FilterUse::kDesign))
+        return 0;
 
     return _srcset_register(ctx, KOVA_MAX_SRCSETS, err, [&](KOVA_SRCSET* set) {
         _fill_reg_tune(set->tune, 0.5, 0.0);

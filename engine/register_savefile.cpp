@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // Registration of a source set read back from a source-set file.
-#include "engine/engine_internal.h"
+#include "engine/srcset_build.h"
 #include "kova/kova_engine.h"
 #include "kova/kova_source.h"
 

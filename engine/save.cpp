@@ -2,7 +2,7 @@
 // Saving a registered source set to a source-set file.
 #include <cstring>
 
-#include "engine/engine_internal.h"
+#include "engine/context_access.h"
 #include "kova/kova_engine.h"
 #include "kova/kova_source.h"
 #include "util/kova_mem.h"

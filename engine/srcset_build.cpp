@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // Building a new source set and adding it to a context's list, for every way of registering.
-#include "engine/engine_internal.h"
+#include "engine/srcset_build.h"
 #include "util/kova_mem.h"
 
 namespace {

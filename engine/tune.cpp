@@ -2,7 +2,7 @@
 // Tuning controls: a set's tune set, the active set's thickness and the output volume.
 #include <cstdint>
 
-#include "engine/engine_internal.h"
+#include "engine/context_access.h"
 #include "kova/kova_dsp.h"
 #include "kova/kova_engine.h"
 

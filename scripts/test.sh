@@ -136,7 +136,10 @@ if ! skipped fuzz; then
         artifacts=$dir/artifacts/$target
         mkdir -p "$work" "$artifacts"
         replay=("$dir/seeds/$seeds")
-        [ -d "fuzz/regressions/$target" ] && replay+=("fuzz/regressions/$target")
+        # One regressions folder per kind of input: both set-file targets read srcset_file.
+        input=$target
+        [ "$target" = file_queries ] && input=srcset_file
+        [ -d "fuzz/regressions/$input" ] && replay+=("fuzz/regressions/$input")
         # Every seed and every saved crash input must pass, then the target is fuzzed.
         "$bin" -runs=0 -close_fd_mask=1 -rss_limit_mb=3072 "${replay[@]}" >"$dir/replay-$target.log" 2>&1 ||
             { grep -v '^kova' "$dir/replay-$target.log" | tail -n 60; exit 1; }

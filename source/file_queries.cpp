@@ -14,9 +14,10 @@
 #include <cstdio>
 #include <cstring>
 
-#include "kova/kova_engine.h"
 #include "kova/kova_source.h"
+#include "source/filter_dsc.h"
 #include "source/source_io.h"
+#include "util/byte_time.h"
 #include "util/kova_mem.h"
 
 using namespace kova_source;
@@ -147,7 +148,7 @@ KOVA_API int kova_get_filters_fromfile(const char* path, KOVA_FLT_DSC flt[KOVA_F
             std::memcpy(
                 &dsc, batch + k * kFltDscBytes,
                 static_cast<size_t>(std::min<int64_t>(kFltDscBytes, got - k * kFltDscBytes)));
-            if (dsc.type < KOVA_FLT_TYPE_COUNT) std::memcpy(&flt[dsc.type], &dsc, sizeof dsc);
+            if (filter_dsc_ok(&dsc, FilterUse::kType)) std::memcpy(&flt[dsc.type], &dsc, sizeof dsc);
         }
         if (got < n * kFltDscBytes) break;  // the end of the file
         left -= n;
@@ -195,10 +196,10 @@ KOVA_API int kova_get_rptinfo_fromfile(const char* path, KOVA_RPT_INFO* info) {
         int32_t payload = 0;
         if (!walk.next(&record, &payload)) continue;  // later present slots keep their values
         info->rpt_start_ms[slot] =
-            static_cast<int32_t>(_cvt_byte_to_ms(record.rpt_start, rate, channels));
+            static_cast<int32_t>(kova::byte_to_ms(record.rpt_start, rate, channels));
         info->rpt_end_ms[slot] =
-            static_cast<int32_t>(_cvt_byte_to_ms(record.rpt_end, rate, channels));
-        info->len_ms[slot] = _cvt_byte_to_ms(record.size, rate, channels);
+            static_cast<int32_t>(kova::byte_to_ms(record.rpt_end, rate, channels));
+        info->len_ms[slot] = kova::byte_to_ms(record.size, rate, channels);
     }
     return KOVA_OK;
 }

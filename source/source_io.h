@@ -31,18 +31,6 @@ constexpr int32_t kLargestSlotBytes = KOVA_SLOT_LOOP_MAX_BYTES;
 // bound. A file above it is refused. (The queries only read descriptors and follow any count.)
 constexpr int32_t kMaxStoredFilters = 64;
 
-// The set reader's bound on a stored channel count: a filter keeps state per channel, so a huge
-// count would allocate without bound. Counts up to it, 0 and negative ones included, are safe
-// (the filter processes 1 to 8 channels and skips counts below 1).
-constexpr int32_t kMaxStoredChannels = 8;
-
-// A stored descriptor is taken unless its type indexes past the per-type tables or its channel
-// count is above kMaxStoredChannels. Other fields are used as stored; the filter design copes
-// with degenerate frequencies.
-inline bool stored_filter_usable(const KOVA_FLT_DSC& dsc) {
-    return dsc.type < KOVA_FLT_TYPE_COUNT && dsc.channels <= kMaxStoredChannels;
-}
-
 // Sizes of the records in a source-set file.
 constexpr int kCountBytes = 4;
 constexpr int kFltDscBytes = 40;

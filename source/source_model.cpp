@@ -4,6 +4,7 @@
 
 #include "kova/kova_list.h"
 #include "kova/kova_source.h"
+#include "source/filter_dsc.h"
 #include "util/kova_mem.h"
 
 extern "C" {
@@ -44,7 +45,7 @@ KOVA_API int kova_update_filterdsc(LIST* filters, const KOVA_FLT_DSC* dsc) {
 
 KOVA_API int kova_is_valid_filter(const KOVA_FLT_DSC* dsc) {
     // Null has no type, so it is not a valid filter either.
-    return (dsc != nullptr && dsc->type < KOVA_FLT_TYPE_COUNT) ? 1 : -1;
+    return kova_source::filter_dsc_ok(dsc, kova_source::FilterUse::kType) ? 1 : -1;
 }
 
 }  // extern "C"

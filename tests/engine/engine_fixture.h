@@ -16,6 +16,7 @@
 #include "kova/kova_engine.h"
 #include "kova/kova_list.h"
 #include "kova/kova_source.h"
+#include "support/temp_dir.h"
 #include "util/kova_mem.h"
 
 namespace kova_test {
@@ -91,27 +92,6 @@ inline std::vector<int16_t> varied(size_t samples) {
     for (size_t k = 0; k < samples; ++k) s[k] = static_cast<int16_t>((k * 37) % 2001) - 1000;
     return s;
 }
-
-// A fresh folder under /tmp, removed with its files.
-struct TempDir {
-    std::string path;
-    TempDir() {
-        char t[] = "/tmp/kova_engXXXXXX";
-        path = mkdtemp(t);
-    }
-    ~TempDir() { std::filesystem::remove_all(path); }
-    TempDir(const TempDir&) = delete;
-    TempDir& operator=(const TempDir&) = delete;
-    std::string file(const std::string& name) const { return path + "/" + name; }
-    // Writes the elements' bytes to `name` and returns its path.
-    template <typename T>
-    std::string write(const std::string& name, const std::vector<T>& v) const {
-        std::ofstream(file(name), std::ios::binary)
-            .write(reinterpret_cast<const char*>(v.data()),
-                   static_cast<std::streamsize>(v.size() * sizeof(T)));
-        return file(name);
-    }
-};
 
 inline KOVA_PARAM event(float x, float y, int64_t time, uint32_t action) {
     return KOVA_PARAM{x, y, time, 0.0f, action};

@@ -60,52 +60,6 @@ class Methods : public jni_test::Loaded {
     kova_test::LogCapture cap;
 };
 
-TEST_F(Methods, InvalidIdsAndEmptySlotsGetTheirResultsAndTouchNothing) {
-    Bytes out(64, 0x5a);
-    for (jlong id : {0L, -5L, 21L, 2L}) {
-        EXPECT_EQ(reg(id, &start, &loop, &end), -3) << id;
-        EXPECT_EQ(set_src(id, 1), -3) << id;
-        EXPECT_EQ(Java_com_corvane_audio_Kova_get_1src_1num(env(), nullptr, id), 0) << id;
-        EXPECT_EQ(gen(id, out, 1, 1, 0, 0), 0) << id;
-        EXPECT_EQ(gen_ft(id, 1, 1, 0, 0), 0) << id;
-        EXPECT_EQ(tune(id, 1, 1.0), -3) << id;
-        EXPECT_EQ(thick(id, 0.5), -3) << id;
-        EXPECT_EQ(vol(id, 0.5), -3) << id;
-        Java_com_corvane_audio_Kova_start_1fasttrack(env(), nullptr, id);
-        Java_com_corvane_audio_Kova_stop_1fasttrack(env(), nullptr, id);
-    }
-    EXPECT_EQ(counters().strings_got, 0);
-    EXPECT_EQ(counters().arrays_got, counters().arrays_released);
-    EXPECT_EQ(out.items, std::vector<jbyte>(64, 0x5a));
-    EXPECT_TRUE(jni_lines(cap).empty());
-    EXPECT_EQ(pKOVAInfo[0].pInstance->pFastTrack->state, 0);  // id 1 untouched
-}
-
-TEST_F(Methods, InstanceWithoutContext) {
-    KovaInstance* inst = pKOVAInfo[0].pInstance;
-    KOVA_CTX* ctx = inst->pCtx;
-    inst->pCtx = nullptr;
-    Bytes out(64);
-    EXPECT_EQ(reg(1, &start, &loop, &end), 0);
-    EXPECT_EQ(counters().strings_got, 3);  // obtained, then all released
-    EXPECT_EQ(counters().strings_released, 3);
-    EXPECT_EQ(set_src(1, 1), -3);
-    EXPECT_EQ(Java_com_corvane_audio_Kova_get_1src_1num(env(), nullptr, 1), 0);
-    EXPECT_EQ(gen(1, out, 1, 1, 0, 0), 0);
-    EXPECT_EQ(gen_ft(1, 1, 1, 0, 0), 0);
-    EXPECT_EQ(tune(1, 1, 1.0), -3);
-    EXPECT_EQ(thick(1, 0.5), -3);
-    EXPECT_EQ(vol(1, 0.5), -3);
-    Java_com_corvane_audio_Kova_start_1fasttrack(env(), nullptr, 1);  // the stream is still there
-    EXPECT_EQ(inst->pFastTrack->state, 1);
-    Java_com_corvane_audio_Kova_stop_1fasttrack(env(), nullptr, 1);
-    EXPECT_EQ(inst->pFastTrack->state, 0);
-    EXPECT_EQ(inst->curSrc, 0);
-    EXPECT_EQ(jni_lines(cap), (Lines{"kova_set_thickness() is failed. (ID is NULL)",
-                                     "kova_set_volume() is failed. (ID is NULL)"}));
-    inst->pCtx = ctx;
-}
-
 TEST_F(Methods, RegistrationAndSelection) {
     EXPECT_EQ(reg(1, &start, nullptr, &end), 0);
     EXPECT_EQ(reg(1, nullptr, &loop, nullptr), 1);

@@ -22,6 +22,7 @@
 #include "kova/kova_engine.h"
 #include "kova/android/kova_registry.h"
 #include "support/log_capture.h"
+#include "support/temp_dir.h"
 #include "util/kova_mem.h"
 
 namespace fake_jni {
@@ -232,27 +233,19 @@ inline void discard(int slot) {
 /* Raw 16-bit stereo PCM: a quiet sine that stays far from clipping after every gain stage. */
 class PcmFiles {
    public:
-    PcmFiles() {
-        char templ[] = "/tmp/kova_jni_XXXXXX";
-        dir_ = mkdtemp(templ);
-    }
-    ~PcmFiles() { std::filesystem::remove_all(dir_); }
-    PcmFiles(const PcmFiles&) = delete;
-    PcmFiles& operator=(const PcmFiles&) = delete;
-
     std::string write(const std::string& name, size_t bytes, double hz) const {
         std::vector<int16_t> s(bytes / 2);
         for (size_t i = 0; i < s.size(); ++i) {
             s[i] = static_cast<int16_t>(400 * std::sin(2 * M_PI * hz * double(i / 2) / 48000.0));
         }
-        const std::string path = dir_ + "/" + name;
+        const std::string path = dir_.file(name);
         std::ofstream(path, std::ios::binary)
             .write(reinterpret_cast<const char*>(s.data()), std::streamsize(bytes));
         return path;
     }
 
    private:
-    std::string dir_;
+    kova_test::TempDir dir_;
 };
 
 }  // namespace jni_test

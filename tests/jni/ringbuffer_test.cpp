@@ -43,11 +43,6 @@ TEST(RingBuffer, SizeIsAPowerOfTwoOfAtLeastTwoAndHoldsOneByteLess) {
     EXPECT_EQ(kova_ringbuffer_create(0x80000001u), nullptr);
     EXPECT_EQ(kova_ringbuffer_create(0xFFFFFFFFu), nullptr);
     EXPECT_EQ(kova_mem_alloc_count(), before);
-    for (long n : {0L, 1L}) {  // record, storage
-        kova_mem_fail_after(n);
-        EXPECT_EQ(kova_ringbuffer_create(64), nullptr) << n;
-        kova_mem_fail_after(-1);
-    }
 }
 
 TEST(RingBuffer, WriteAcrossTheEndLandsInTwoPiecesAndReadsBackInOrder) {
@@ -76,19 +71,6 @@ TEST(RingBuffer, WriteAcrossTheEndLandsInTwoPiecesAndReadsBackInOrder) {
     EXPECT_EQ(kova_ringbuffer_read_space(rb.get()), 0u);
     EXPECT_EQ(kova_ringbuffer_write_space(rb.get()), 15u);
     EXPECT_TRUE(std::all_of(rb->buf, rb->buf + 16, [](uint8_t b) { return b == 0; }));
-}
-
-TEST(RingBuffer, NullArgumentsAreHarmless) {
-    uint8_t byte = 9;
-    EXPECT_EQ(kova_ringbuffer_read_space(nullptr), 0u);
-    EXPECT_EQ(kova_ringbuffer_write_space(nullptr), 0u);
-    EXPECT_EQ(kova_ringbuffer_read(nullptr, &byte, 1), 0u);
-    EXPECT_EQ(kova_ringbuffer_write(nullptr, &byte, 1), 0u);
-    kova_ringbuffer_reset(nullptr);
-    kova_ringbuffer_free(nullptr);
-    Ring rb = make_ring(8);
-    EXPECT_EQ(kova_ringbuffer_write(rb.get(), nullptr, 4), 0u);
-    EXPECT_EQ(kova_ringbuffer_read_space(rb.get()), 0u);
 }
 
 // Random writes and reads against a plain queue: contents, order and both spaces agree at every

@@ -105,31 +105,16 @@ const KOVA_FORMAT kPhone{48000, 2, 1, 1080, 2280};
 const KOVA_FLT_DSC kLowpass{KOVA_FLT_LOWPASS, 2000.0, 1.0, 1, 48000, 2};
 const KOVA_FLT_DSC kBandpass{KOVA_FLT_BANDPASS, 1200.0, 0.7, 1, 48000, 2};
 
-// Runs `attempt` with allocation n failing, for n = 0, 1, ..., until a run never reached its
-// n-th allocation. `attempt` gets whether that failure was met (it may be swallowed, e.g. by a
-// slot left empty) and checks and undoes its own effects. Returns the number of allocations
-// the operation makes when nothing fails.
-int sweep(const char* what, const std::function<void(long n)>& attempt) {
-    const auto run = [&](long n) {
-        testing::internal::CaptureStdout();  // the engine's diagnostic lines
-        attempt(n);
-        testing::internal::GetCapturedStdout();
-    };
-    run(-1);  // warm-up: one-time allocations of the C library, the log and the capture
-    for (long n = 0; n < 500; ++n) {
-        SCOPED_TRACE(std::string(what) + ", allocation " + std::to_string(n) + " failing");
-        const long long heap = heap_in_use();
-        const unsigned long before = kova_mem_alloc_count();
-        run(n);
-        const unsigned long made = kova_mem_alloc_count() - before;
-        if (kHeapMeasurable) {
-            EXPECT_EQ(heap_in_use(), heap) << "bytes not given back";
-        }
-        if (made <= static_cast<unsigned long>(n)) return static_cast<int>(n);
-    }
-    ADD_FAILURE() << what << ": more than 500 allocations";
-    return 0;
-}
+// One allocating operation, run with allocation n failing by `attempt(n)`, which checks that the
+// result is success or a documented failure, that what existed is intact, and undoes its own
+// effects; it returns whether the operation failed. A failed run's standard output must end with
+// `printed`; with nothing failing, the operation makes at least `min_allocs` allocations.
+struct Op {
+    const char* what;
+    std::function<bool(long n)> attempt;
+    std::string printed = "";
+    long min_allocs = 1;
+};
 
 // Runs `call` with the n-th allocation failing (n < 0: none fails).
 template <typename F>
@@ -138,6 +123,55 @@ auto failing_at(long n, F call) {
     auto result = call();
     kova_mem_fail_after(-1);
     return result;
+}
+
+// Sweeps n = 0, 1, ... until a run never reached its n-th allocation; each run must give back
+// every byte (plain builds; sanitizers and valgrind keep their own books).
+void sweep(const Op& op) {
+    const auto run = [&](long n) {
+        testing::internal::CaptureStdout();  // the library's diagnostic lines
+        const bool failed = op.attempt(n);
+        const std::string out = testing::internal::GetCapturedStdout();
+        if (testing::Test::HasFailure()) std::fputs(out.c_str(), stderr);  // gtest's lines too
+        if (failed && n >= 0) {
+            EXPECT_TRUE(
+                out.size() >= op.printed.size() &&
+                out.compare(out.size() - op.printed.size(), op.printed.size(), op.printed) == 0)
+                << out;
+        }
+    };
+    run(-1);  // warm-up: one-time allocations of the C library, the log and the capture
+    for (long n = 0; n < 500; ++n) {
+        SCOPED_TRACE(std::string(op.what) + ", allocation " + std::to_string(n) + " failing");
+        const long long heap = heap_in_use();
+        const unsigned long before = kova_mem_alloc_count();
+        run(n);
+        const unsigned long made = kova_mem_alloc_count() - before;
+        if (kHeapMeasurable) {
+            EXPECT_EQ(heap_in_use(), heap) << "bytes not given back";
+        }
+        if (made <= static_cast<unsigned long>(n)) {
+            EXPECT_GE(n, op.min_allocs);
+            return;
+        }
+    }
+    ADD_FAILURE() << op.what << ": more than 500 allocations";
+}
+
+bool one_of(int v, std::initializer_list<int> codes) {
+    for (int c : codes) {
+        if (v == c) return true;
+    }
+    ADD_FAILURE() << "undocumented result " << v;
+    return false;
+}
+
+// A constructor's result: released when it was made, else `err` holds a documented code. (`err`
+// by reference: it is read only after the constructor ran.)
+template <typename T, typename Release>
+bool made_or(T* made, Release release, const int32_t& err, std::initializer_list<int> codes) {
+    if (made != nullptr) return release(made) != KOVA_OK;
+    return one_of(err, codes);
 }
 
 class AllocFailure : public testing::Test {
@@ -169,211 +203,235 @@ class AllocFailure : public testing::Test {
         return ctx;
     }
 
-    // A start event on the active set still plays the start sound.
-    static void expect_playable(KOVA_CTX* ctx) {
+    // Runs `edit` on a context with one set; whatever an edit lost, the set stays registered and
+    // its start sound plays whole or not at all.
+    bool on_engine(const std::function<bool(KOVA_CTX*)>& edit) {
+        KOVA_CTX* ctx = engine_with_set();
+        EXPECT_NE(ctx, nullptr);
+        if (ctx == nullptr) return false;
+        const bool failed = edit(ctx);
+        EXPECT_GE(kova_get_src_num(ctx), 1);
+        EXPECT_EQ(kova_set_active_src(ctx, 1), KOVA_OK);
         std::vector<int16_t> out(48000);
         KOVA_PCMBUF buf{out.data(), static_cast<int32_t>(out.size() * 2)};
         const KOVA_PARAM down{100.0f, 100.0f, 10, 0.0f, KOVA_ACTION_START};
-        EXPECT_EQ(kova_gen_sounds(ctx, &down, &buf), 4000);
+        const int32_t bytes = kova_gen_sounds(ctx, &down, &buf);
+        EXPECT_TRUE(bytes == 4000 || bytes == 0) << bytes;
+        EXPECT_EQ(kova_deinit(ctx), KOVA_OK);
+        return failed;
     }
 
     jni_test::PcmFiles files_;
     std::string start_, loop_, end_, saved_;
 };
 
-TEST_F(AllocFailure, EngineLifecycleAndRegistrations) {
-    EXPECT_GT(sweep("kova_init",
-                    [](long n) {
-                        int32_t err = 0;
-                        KOVA_CTX* ctx = failing_at(n, [&] { return kova_init(&kPhone, &err); });
-                        if (ctx == nullptr) {
-                            EXPECT_EQ(err, KOVA_ERR_INSUFF_MEM);
-                        } else {
-                            EXPECT_EQ(err, KOVA_OK);
-                            EXPECT_EQ(kova_deinit(ctx), KOVA_OK);
-                        }
-                    }),
-              5);
-
-    // Each registration on a context that already plays a set: a failure adds nothing and the
-    // first set still plays; a registration that got through has its loop.
-    enum Way { kFiles, kFilter, kSaveFile };
-    for (Way way : {kFiles, kFilter, kSaveFile}) {
-        sweep("registration", [&](long n) {
-            KOVA_CTX* ctx = engine_with_set();
-            ASSERT_NE(ctx, nullptr);
-            const char* paths[3] = {start_.c_str(), loop_.c_str(), end_.c_str()};
-            int32_t err = 0;
-            const int32_t id = failing_at(n, [&] {
-                return way == kFiles    ? kova_reg_src_byfiles(ctx, paths, &err)
-                       : way == kFilter ? kova_reg_src_byfilter(ctx, &kLowpass, &err)
-                                        : kova_reg_src_bysavefile(ctx, saved_.c_str(), &err);
-            });
-            if (id == 0) {
-                EXPECT_TRUE(err == KOVA_ERR_INSUFF_MEM || err == KOVA_ERR_SOURCE ||
-                            err == KOVA_ERR_INVALID_PARAM)
-                    << err;
-                EXPECT_EQ(kova_get_src_num(ctx), 1);
-                EXPECT_EQ(ctx->active_src, 1);
-            } else {
-                EXPECT_EQ(id, 2);
-                EXPECT_EQ(err, KOVA_OK);
-                KOVA_RPT_INFO info{};
-                EXPECT_EQ(kova_get_rptinfo(ctx, 2, &info), KOVA_OK);
-                EXPECT_GT(info.len_ms[KOVA_SLOT_LOOP], 0);
-                ASSERT_EQ(kova_set_active_src(ctx, 1), KOVA_OK);
-            }
-            expect_playable(ctx);
-            EXPECT_EQ(kova_deinit(ctx), KOVA_OK);
-        });
-    }
-}
-
-TEST_F(AllocFailure, EditingAndSavingASet) {
-    enum Op { kUpdate, kAttach, kReplaceFiles, kSave };
-    for (Op op : {kUpdate, kAttach, kReplaceFiles, kSave}) {
-        sweep("set edit", [&](long n) {
-            KOVA_CTX* ctx = engine_with_set();
-            ASSERT_NE(ctx, nullptr);
-            const std::string out = saved_ + ".out";
-            std::remove(out.c_str());
-            const char* paths[3] = {start_.c_str(), loop_.c_str(), nullptr};
-            KOVA_FLT_DSC narrower = kBandpass;
-            narrower.bandwidth = 0.3;
-            KOVA_FLT_DSC highpass{KOVA_FLT_HIGHPASS, 150.0, 1.0, 1, 48000, 2};
-            int32_t err = 0;
-            const int32_t rc = failing_at(n, [&] {
-                switch (op) {
-                    case kUpdate:
-                        return kova_update_filter(ctx, 1, &narrower, &err);
-                    case kAttach:
-                        return kova_attach_filter(ctx, 1, &highpass, &err);
-                    case kReplaceFiles:
-                        return kova_update_src_byfiles(ctx, 1, paths, &err);
-                    case kSave:
-                        return kova_save_source(ctx, 1, out.c_str());
-                }
-                return 0;
-            });
-            // Whatever an edit lost, the set stays registered and generation stays in bounds.
-            EXPECT_EQ(kova_get_src_num(ctx), 1);
-            if (op == kSave) {
-                EXPECT_TRUE(rc > 0 || rc == KOVA_ERR_SOURCE || rc == KOVA_ERR_INVALID_PARAM) << rc;
-            } else if (rc == 0) {
-                EXPECT_TRUE(err == KOVA_ERR_INSUFF_MEM || err == KOVA_ERR_SOURCE ||
-                            err == KOVA_ERR_INVALID_PARAM)
-                    << err;
-            } else {
-                EXPECT_EQ(rc, 1);
-            }
-            std::vector<int16_t> buf(48000);
-            KOVA_PCMBUF pcm{buf.data(), static_cast<int32_t>(buf.size() * 2)};
-            const KOVA_PARAM down{100.0f, 100.0f, 10, 0.0f, KOVA_ACTION_START};
-            const int32_t bytes = kova_gen_sounds(ctx, &down, &pcm);
-            EXPECT_TRUE(bytes == 0 || bytes == 4000) << bytes;
-            EXPECT_EQ(kova_deinit(ctx), KOVA_OK);
-            std::remove(out.c_str());
-        });
-    }
-}
-
-TEST_F(AllocFailure, FileReadingAndQueries) {
-    for (int slot = 0; slot < KOVA_SLOT_COUNT; ++slot) {
-        sweep("kova_load_sound_source", [&](long n) {
-            int err = 0;
-            KOVA_SRC* src =
-                failing_at(n, [&] { return kova_load_sound_source(loop_.c_str(), slot, &err); });
-            if (src == nullptr) {
-                EXPECT_TRUE(err == KOVA_ERR_INSUFF_MEM || err == KOVA_ERR_SOURCE) << err;
-            } else {
-                EXPECT_EQ(err, KOVA_OK);
-                EXPECT_EQ(src->size, 20000);
-                kova_free_sourceobj(src);
-            }
-        });
-    }
-    sweep("kova_read_source_file", [&](long n) {
-        char buf[64];
-        const int got = failing_at(n, [&] { return kova_read_source_file(end_.c_str(), buf, 64); });
-        EXPECT_TRUE(got == 64 || got == 0) << got;
-    });
-    sweep("kova_open_source", [&](long n) {
-        KOVA_SRCSET set{};
-        set.filters = list_create();
-        set.tune = static_cast<KOVA_TUNE_SET*>(kova_mem_calloc(1, sizeof(KOVA_TUNE_SET)));
-        ASSERT_NE(set.filters, nullptr);
-        ASSERT_NE(set.tune, nullptr);
-        const int rc = failing_at(n, [&] { return kova_open_source(&set, saved_.c_str()); });
-        if (rc == KOVA_OK) {
-            EXPECT_EQ(set.filters->count, 2u);
-        } else {
-            EXPECT_TRUE(rc == KOVA_ERR_INSUFF_MEM || rc == KOVA_ERR_INVALID_PARAM) << rc;
-        }
-        // The caller frees a set that failed half-way, as registration does.
-        auto* owned = static_cast<KOVA_SRCSET*>(kova_mem_calloc(1, sizeof(KOVA_SRCSET)));
-        ASSERT_NE(owned, nullptr);
-        *owned = set;
-        kova_free_sourceset(owned);
-    });
-    sweep("file queries", [&](long n) {
-        int off[3] = {-1, -1, -1}, size[3] = {-1, -1, -1};
-        KOVA_FLT_DSC flt[KOVA_FLT_TYPE_COUNT] = {};
-        KOVA_TUNE_SET tune{};
-        KOVA_RPT_INFO rpt{};
-        const int rc[4] = {
-            failing_at(n,
-                       [&] {
-                           return kova_get_pcminfo_fromfile(saved_.c_str(), &off[0], &size[0],
-                                                            &off[1], &size[1], &off[2], &size[2]);
-                       }),
-            failing_at(n, [&] { return kova_get_filters_fromfile(saved_.c_str(), flt); }),
-            failing_at(n, [&] { return kova_get_tuneset_fromfile(saved_.c_str(), &tune); }),
-            failing_at(n, [&] { return kova_get_rptinfo_fromfile(saved_.c_str(), &rpt); }),
-        };
-        for (int r : rc)
-            EXPECT_TRUE(r == KOVA_OK || r == KOVA_ERR_INSUFF_MEM || r == KOVA_ERR_INVALID_PARAM)
-                << r;
-        if (rc[0] == KOVA_OK) {
-            EXPECT_EQ(size[KOVA_SLOT_LOOP], 20000);
-        }
-    });
-}
-
-TEST_F(AllocFailure, JavaInstancesAndStreams) {
+TEST_F(AllocFailure, EveryOperationReportsReleasesAndKeepsWhatExisted) {
+    const char* paths[3] = {nullptr, nullptr, nullptr};
+    int32_t err = 0;
+    const std::string out = saved_ + ".out";
+    const KOVA_FLT_DSC highpass{KOVA_FLT_HIGHPASS, 150.0, 1.0, 1, 48000, 2};
+    KOVA_FLT_DSC narrower = kBandpass;
+    narrower.bandwidth = 0.3;
     JNIEnv* env = fake_jni::env();
     ASSERT_EQ(JNI_OnLoad(fake_jni::vm(), nullptr), JNI_VERSION_1_6);
-    EXPECT_GT(sweep("Java init",
-                    [&](long n) {
-                        const jlong id = failing_at(n, [&] {
-                            return Java_com_corvane_audio_Kova_init(env, nullptr, 48000, 2, 1, 1080,
-                                                                    2280);
-                        });
-                        // The registry lock outlives a failed init and goes with a deinit; the
-                        // load hook brings it back so every run ends with one lock, as it began.
-                        if (id < 1) {
-                            EXPECT_TRUE(id == 0 || id == -1) << id;
-                            for (const KovaInfo& slot : pKOVAInfo) EXPECT_EQ(slot.isUsed, 0);
-                            EXPECT_EQ(JNI_OnLoad(fake_jni::vm(), nullptr), JNI_VERSION_1_6);
-                            return;
-                        }
-                        fake_jni::String s[3] = {{start_}, {loop_}, {end_}};
-                        EXPECT_EQ(Java_com_corvane_audio_Kova_reg_1src_1byfiles(
-                                      env, nullptr, id, fake_jni::jstr(s[0]), fake_jni::jstr(s[1]),
-                                      fake_jni::jstr(s[2])),
-                                  1);
-                        Java_com_corvane_audio_Kova_start_1fasttrack(env, nullptr, id);
-                        EXPECT_EQ(Java_com_corvane_audio_Kova_gen_1tofasttrack(
-                                      env, nullptr, id, 10.0f, 10.0f, 5, 0.0f, KOVA_ACTION_START),
-                                  4000);
-                        Java_com_corvane_audio_Kova_stop_1fasttrack(env, nullptr, id);
-                        EXPECT_EQ(Java_com_corvane_audio_Kova_deinit(env, nullptr, id), 0);
-                        EXPECT_EQ(JNI_OnLoad(fake_jni::vm(), nullptr), JNI_VERSION_1_6);
-                    }),
-              3);
-    sweep("kova_open_fasttrack", [](long n) {
-        KOVA_FASTTRACK* ft = failing_at(n, [] { return kova_open_fasttrack(48000, 2); });
-        kova_close_fasttrack(ft, 1);
-    });
+    fake_jni::String s[3] = {{start_}, {loop_}, {end_}};
+    // A registration on a context that already plays a set: a failure adds nothing.
+    auto reg = [&](long n, auto call) {
+        return on_engine([&](KOVA_CTX* ctx) {
+            paths[0] = start_.c_str(), paths[1] = loop_.c_str(), paths[2] = end_.c_str();
+            const int32_t id = failing_at(n, [&] { return call(ctx); });
+            if (id != 0) {
+                EXPECT_EQ(id, 2);
+                EXPECT_EQ(err, KOVA_OK);
+                return false;
+            }
+            one_of(err, {KOVA_ERR_INSUFF_MEM, KOVA_ERR_SOURCE, KOVA_ERR_INVALID_PARAM});
+            EXPECT_EQ(kova_get_src_num(ctx), 1);
+            return true;
+        });
+    };
+    // An edit of set 1: 1 or the documented code.
+    auto edit = [&](long n, auto call) {
+        return on_engine([&](KOVA_CTX* ctx) {
+            paths[0] = start_.c_str(), paths[1] = loop_.c_str(), paths[2] = nullptr;
+            if (failing_at(n, [&] { return call(ctx); }) == 1) return false;
+            return one_of(err, {KOVA_ERR_INSUFF_MEM, KOVA_ERR_SOURCE, KOVA_ERR_INVALID_PARAM});
+        });
+    };
+    const Op ops[] = {
+        {"kova_init",
+         [&](long n) {
+             return made_or(failing_at(n, [&] { return kova_init(&kPhone, &err); }), kova_deinit,
+                            err, {KOVA_ERR_INSUFF_MEM});
+         },
+         "KOVA_CTX malloc fail \nkova_init() fail. err code (-2) \n", 8},
+        {"register files",
+         [&](long n) {
+             return reg(n, [&](KOVA_CTX* c) { return kova_reg_src_byfiles(c, paths, &err); });
+         }},
+        {"register filter",
+         [&](long n) {
+             return reg(n, [&](KOVA_CTX* c) { return kova_reg_src_byfilter(c, &kLowpass, &err); });
+         }},
+        {"register saved file",
+         [&](long n) {
+             return reg(
+                 n, [&](KOVA_CTX* c) { return kova_reg_src_bysavefile(c, saved_.c_str(), &err); });
+         }},
+        {"update filter",
+         [&](long n) {
+             return edit(n, [&](KOVA_CTX* c) { return kova_update_filter(c, 1, &narrower, &err); });
+         }},
+        {"attach filter",
+         [&](long n) {
+             return edit(n, [&](KOVA_CTX* c) { return kova_attach_filter(c, 1, &highpass, &err); });
+         }},
+        {"replace files",
+         [&](long n) {
+             return edit(n,
+                         [&](KOVA_CTX* c) { return kova_update_src_byfiles(c, 1, paths, &err); });
+         }},
+        {"save",
+         [&](long n) {
+             return on_engine([&](KOVA_CTX* ctx) {
+                 const int rc =
+                     failing_at(n, [&] { return kova_save_source(ctx, 1, out.c_str()); });
+                 std::remove(out.c_str());
+                 return rc > 0 ? false : one_of(rc, {KOVA_ERR_SOURCE, KOVA_ERR_INVALID_PARAM});
+             });
+         }},
+        {"load sound source",
+         [&](long n) {
+             KOVA_SRC* src =
+                 failing_at(n, [&] { return kova_load_sound_source(loop_.c_str(), 1, &err); });
+             if (src == nullptr) return one_of(err, {KOVA_ERR_INSUFF_MEM, KOVA_ERR_SOURCE});
+             EXPECT_EQ(src->size, 20000);
+             kova_free_sourceobj(src);
+             return false;
+         }},
+        {"read source file",
+         [&](long n) {
+             char buf[64];
+             const int got =
+                 failing_at(n, [&] { return kova_read_source_file(end_.c_str(), buf, 64); });
+             return got == 64 ? false : one_of(got, {0});
+         }},
+        {"open saved set",
+         [&](long n) {
+             KOVA_SRCSET* set = static_cast<KOVA_SRCSET*>(kova_mem_calloc(1, sizeof(KOVA_SRCSET)));
+             set->filters = list_create();
+             set->tune = static_cast<KOVA_TUNE_SET*>(kova_mem_calloc(1, sizeof(KOVA_TUNE_SET)));
+             const int rc = failing_at(n, [&] { return kova_open_source(set, saved_.c_str()); });
+             if (rc == KOVA_OK) {
+                 EXPECT_EQ(set->filters->count, 2u);
+             }
+             kova_free_sourceset(set);  // the caller frees a set that failed half-way
+             return rc == KOVA_OK ? false
+                                  : one_of(rc, {KOVA_ERR_INSUFF_MEM, KOVA_ERR_INVALID_PARAM});
+         }},
+        {"file queries",
+         [&](long n) {
+             int off[3] = {-1, -1, -1}, size[3] = {-1, -1, -1};
+             KOVA_FLT_DSC flt[KOVA_FLT_TYPE_COUNT] = {};
+             KOVA_TUNE_SET tune{};
+             KOVA_RPT_INFO rpt{};
+             const char* p = saved_.c_str();
+             const int rc[4] = {failing_at(n,
+                                           [&] {
+                                               return kova_get_pcminfo_fromfile(
+                                                   p, &off[0], &size[0], &off[1], &size[1], &off[2],
+                                                   &size[2]);
+                                           }),
+                                failing_at(n, [&] { return kova_get_filters_fromfile(p, flt); }),
+                                failing_at(n, [&] { return kova_get_tuneset_fromfile(p, &tune); }),
+                                failing_at(n, [&] { return kova_get_rptinfo_fromfile(p, &rpt); })};
+             bool failed = false;
+             for (int r : rc)
+                 failed |= r != KOVA_OK && one_of(r, {KOVA_ERR_INSUFF_MEM, KOVA_ERR_INVALID_PARAM});
+             if (rc[0] == KOVA_OK) {
+                 EXPECT_EQ(size[KOVA_SLOT_LOOP], 20000);
+             }
+             return failed;
+         }},
+        {"filter",
+         [&](long n) {
+             return made_or(failing_at(n, [&] { return kova_flt_init(&kBandpass, &err); }),
+                            kova_flt_deinit, err, {KOVA_ERR_INSUFF_MEM});
+         },
+         "KOVA_CTX malloc fail \nkova_flt_init() fail. err code (-2) \n", 7},
+        {"oscillator",
+         [&](long n) {
+             KOVA_OSC* osc = failing_at(n, [&] { return kova_osc_init(48000, 2, 0); });
+             return osc == nullptr || kova_osc_deinit(osc) != KOVA_OK;
+         },
+         "KOVA_CTX malloc fail \nkova_osc_init() fail. err code (KOVA_ERR_INSUFF_MEM) \n"},
+        {"noise source",
+         [&](long n) {
+             KOVA_SRC* src =
+                 failing_at(n, [&] { return kova_gen_sound_source_wn(&kLowpass, 1, &err); });
+             if (src != nullptr) return kova_free_sourceobj(src), false;
+             return one_of(err, {KOVA_ERR_INSUFF_MEM});
+         },
+         "kova_gen_sound_source() fail.", 3},
+        {"ring buffer",
+         [&](long n) {
+             KOVA_RINGBUFFER* rb = failing_at(n, [] { return kova_ringbuffer_create(64); });
+             return rb == nullptr || (kova_ringbuffer_free(rb), false);
+         },
+         "", 2},
+        {"file access",
+         [&](long n) {
+             TARQ_MFAL m{};
+             if (failing_at(n, [&] { return tarq_mfal_init(end_.c_str(), &m); }) != 0) return true;
+             kova_mem_free(m.path);
+             return false;
+         }},
+        {"list",
+         [&](long n) {
+             LIST* l = failing_at(n, [] { return list_create(); });
+             if (l == nullptr) return true;
+             int a = 1, b = 2;
+             list_pushback(l, &a);
+             const bool failed =
+                 failing_at(n, [&] { return insert_after(l, l->head, &b); }) == nullptr;
+             EXPECT_EQ(l->count, failed ? 1u : 2u);
+             EXPECT_EQ(list_getat(l, failed ? 0 : 1)->data, &a);
+             list_destory(l, [](void*) {});  // the elements live on the stack
+             return failed;
+         },
+         "", 3},
+        {"fast-track stream",
+         [&](long n) {
+             KOVA_FASTTRACK* ft = failing_at(n, [] { return kova_open_fasttrack(48000, 2); });
+             kova_close_fasttrack(ft, 1);
+             return ft == nullptr;
+         },
+         "", 4},
+        {"Java instance",
+         [&](long n) {
+             const jlong id = failing_at(n, [&] { return jni_test::init_default(); });
+             // The registry lock outlives a failed init and goes with a deinit; the load hook
+             // brings it back so every run ends with one lock, as it began.
+             if (id < 1) {
+                 for (const KovaInfo& slot : pKOVAInfo) EXPECT_EQ(slot.isUsed, 0);
+                 EXPECT_EQ(JNI_OnLoad(fake_jni::vm(), nullptr), JNI_VERSION_1_6);
+                 return one_of(static_cast<int>(id), {0, -1});
+             }
+             EXPECT_EQ(Java_com_corvane_audio_Kova_reg_1src_1byfiles(
+                           env, nullptr, id, fake_jni::jstr(s[0]), fake_jni::jstr(s[1]),
+                           fake_jni::jstr(s[2])),
+                       1);
+             Java_com_corvane_audio_Kova_start_1fasttrack(env, nullptr, id);
+             EXPECT_EQ(
+                 Java_com_corvane_audio_Kova_gen_1tofasttrack(env, nullptr, id, 10, 10, 5, 0, 0),
+                 4000);
+             EXPECT_EQ(jni_test::deinit(id), 0);
+             EXPECT_EQ(JNI_OnLoad(fake_jni::vm(), nullptr), JNI_VERSION_1_6);
+             return false;
+         },
+         "", 3},
+    };
+    for (const Op& op : ops) sweep(op);
 }
 
 // Many whole lifecycles in a row: whatever one leaves behind adds up.

@@ -14,6 +14,7 @@
 
 #include "kova/kova_list.h"
 #include "kova/kova_source.h"
+#include "support/temp_dir.h"
 #include "util/kova_mem.h"
 
 // Exact heap counts exist only with the sanitizer allocator (glibc keeps freed chunks in caches
@@ -31,14 +32,7 @@ inline size_t heap_in_use() {
 
 using Bytes = std::vector<uint8_t>;
 
-struct TempDir {
-    std::string dir = [] {
-        std::string t = std::filesystem::temp_directory_path() / "kova_src_XXXXXX";
-        return std::string(mkdtemp(t.data()));
-    }();
-    ~TempDir() { std::filesystem::remove_all(dir); }
-    std::string file(const std::string& name) const { return dir + "/" + name; }
-};
+using kova_test::TempDir;
 
 inline void write_file(const std::string& path, const Bytes& b) {
     std::ofstream(path, std::ios::binary).write(reinterpret_cast<const char*>(b.data()), b.size());

@@ -50,7 +50,6 @@ TEST(List, CreateIsEmptyAndGetatKeepsInBounds) {
     EXPECT_EQ(*static_cast<int*>(list_getat(l, 2)->data), 20);
     EXPECT_EQ(list_getat(l, 3), nullptr);
     EXPECT_EQ(list_getat(l, 0xFFFFFFFFu), nullptr);
-    EXPECT_EQ(list_getat(nullptr, 0), nullptr);
     EXPECT_EQ(list_getNode(l, 1), list_getat(l, 1));
     list_destory(l, nullptr);
 }
@@ -63,8 +62,6 @@ TEST(List, InsertAtSentinelsAppendsAndPrepends) {
     insert_before(l, l->tail, boxed(3));  // append
     insert_after(l, list_getat(l, 1), boxed(9));
     EXPECT_EQ(values(l), (std::vector<int>{0, 1, 9, 2, 3}));
-    EXPECT_EQ(insert_after(nullptr, l->head, nullptr), nullptr);
-    EXPECT_EQ(insert_before(l, nullptr, nullptr), nullptr);
     list_destory(l, nullptr);
 }
 
@@ -84,7 +81,6 @@ TEST(List, RemoveNodeChoosesElementsForSentinels) {
     // del_node frees a detached node and hands back its successor (null here).
     EXPECT_EQ(del_node(first, nullptr), nullptr);
     EXPECT_EQ(del_node(last, nullptr), nullptr);
-    EXPECT_EQ(del_node(nullptr, nullptr), nullptr);
     list_destory(l, nullptr);
 }
 
@@ -108,7 +104,6 @@ TEST(List, DestroyReleasesSentinelsTooAndDelNodeWalksAChain) {
     list_destory(l, counting_release);
     EXPECT_EQ(g_released, 5);
     EXPECT_EQ(g_released_null, 2);
-    list_destory(nullptr, counting_release);  // no effect
 
     // Tear a whole chain down node by node, sentinels included.
     l = list_create();
@@ -135,29 +130,9 @@ TEST(List, AttachSplicesAndLeavesSourceReusable) {
     list_attach(dst, empty);
     EXPECT_EQ(values(dst), (std::vector<int>{1, 2, 3}));
     EXPECT_EQ(empty->head->next, empty->tail);
-    list_attach(nullptr, src);
-    list_attach(dst, nullptr);
     list_destory(dst, nullptr);
     list_destory(src, nullptr);
     list_destory(empty, nullptr);
-}
-
-TEST(List, AllocationFailureLeavesListUnchanged) {
-    for (long k = 0; k < 3; ++k) {
-        kova_mem_fail_after(k);
-        EXPECT_EQ(list_create(), nullptr) << "failing allocation " << k;
-        kova_mem_fail_after(-1);
-    }
-    LIST* l = list_create();
-    list_pushback(l, boxed(1));
-    int* extra = boxed(2);
-    kova_mem_fail_after(0);
-    EXPECT_EQ(list_pushback(l, extra), nullptr);
-    EXPECT_EQ(insert_after(l, l->head, extra), nullptr);
-    kova_mem_fail_after(-1);
-    EXPECT_EQ(values(l), (std::vector<int>{1}));
-    kova_mem_free(extra);
-    list_destory(l, nullptr);
 }
 
 }  // namespace

@@ -72,7 +72,9 @@ bool parse_filter_type(const std::string& text, uint32_t& type) {
     return false;
 }
 
-/* Completes one --filter once the rate is known: frequencies must lie below the Nyquist rate. */
+/* Completes one --filter once the rate is known: frequencies must lie below the Nyquist rate.
+ * These ranges only name the bad field in a usage message; whether a descriptor is usable is the
+ * library's decision (it refuses the registration otherwise). */
 void finish_filter(FilterArg& f, const FormatOptions& fmt) {
     const std::vector<std::string> parts = CLI::detail::split(f.text, ':');
     if (parts.size() < 2 || parts.size() > 3) {

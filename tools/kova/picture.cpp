@@ -153,31 +153,71 @@ void draw_waveform(cairo_t* cr, const Layout& l, const std::vector<int16_t>& pcm
     }
 }
 
-/* Short-time spectrum of the channel mix, one Hann-windowed FFT per pixel column, linear
- * frequency axis from 0 Hz (bottom) to half the sample rate (top). */
-void draw_spectrogram(cairo_t* cr, const Layout& l, const std::vector<int16_t>& pcm, uint32_t rate,
-                      uint32_t channels, size_t frames) {
-    const int cols = static_cast<int>(l.plot_w);
-    const int rows = static_cast<int>(l.spectro_h);
-    if (cols < 1 || rows < 1) return;
-    const int nfft = rate >= 32000 ? 1024 : 512;
-    const int bins = nfft / 2 + 1;
-    std::vector<double> window(nfft);
-    double wsum = 0;
-    for (int i = 0; i < nfft; ++i) {
-        window[i] = 0.5 - 0.5 * std::cos(2.0 * std::numbers::pi * i / nfft);
-        wsum += window[i];
+// A Hann-windowed real FFT of `nfft` points, with its buffers and plan.
+class Spectrum {
+   public:
+    explicit Spectrum(int nfft)
+        : nfft_(nfft),
+          bins_(nfft / 2 + 1),
+          window_(nfft),
+          in_(static_cast<double*>(fftw_malloc(sizeof(double) * nfft))),
+          out_(static_cast<fftw_complex*>(fftw_malloc(sizeof(fftw_complex) * bins_))) {
+        if (!in_ || !out_) {
+            fftw_free(in_);
+            fftw_free(out_);
+            failure("out of memory for the spectrogram");
+        }
+        for (int i = 0; i < nfft; ++i) {
+            window_[i] = 0.5 - 0.5 * std::cos(2.0 * std::numbers::pi * i / nfft);
+            wsum_ += window_[i];
+        }
+        plan_ = fftw_plan_dft_r2c_1d(nfft, in_, out_, FFTW_ESTIMATE);
     }
-    auto* in = static_cast<double*>(fftw_malloc(sizeof(double) * nfft));
-    auto* spectrum = static_cast<fftw_complex*>(fftw_malloc(sizeof(fftw_complex) * bins));
-    if (!in || !spectrum) {
-        fftw_free(in);
-        fftw_free(spectrum);
-        failure("out of memory for the spectrogram");
+    ~Spectrum() {
+        fftw_destroy_plan(plan_);
+        fftw_free(in_);
+        fftw_free(out_);
+        fftw_cleanup();
     }
-    fftw_plan plan = fftw_plan_dft_r2c_1d(nfft, in, spectrum, FFTW_ESTIMATE);
+    Spectrum(const Spectrum&) = delete;
+    Spectrum& operator=(const Spectrum&) = delete;
 
-    // Bin range of each pixel row (row 0 is the top, the highest frequencies).
+    int bins() const { return bins_; }
+
+    // Level in dB of each bin for the window centred on frame `centre` (channels mixed; frames
+    // outside the sound count as silence). A full-scale sine at a bin's centre reads 0 dB.
+    void levels(const std::vector<int16_t>& pcm, uint32_t channels, size_t frames, long long centre,
+                std::vector<double>& db) {
+        const long long first = centre - nfft_ / 2;
+        for (int i = 0; i < nfft_; ++i) {
+            const long long f = first + i;
+            double v = 0;
+            if (f >= 0 && static_cast<size_t>(f) < frames) {
+                for (uint32_t c = 0; c < channels; ++c)
+                    v += pcm[static_cast<size_t>(f) * channels + c];
+                v /= 32768.0 * channels;
+            }
+            in_[i] = v * window_[i];
+        }
+        fftw_execute(plan_);
+        for (int b = 0; b < bins_; ++b) {
+            const double mag = std::hypot(out_[b][0], out_[b][1]) / (wsum_ / 2.0);
+            db[b] = 20.0 * std::log10(std::max(mag, 1e-12));
+        }
+    }
+
+   private:
+    int nfft_;
+    int bins_;
+    std::vector<double> window_;
+    double wsum_ = 0;
+    double* in_;
+    fftw_complex* out_;
+    fftw_plan plan_;
+};
+
+// Bin range of each pixel row (row 0 is the top, the highest frequencies).
+std::vector<std::pair<int, int>> row_bin_ranges(int rows, int bins) {
     std::vector<std::pair<int, int>> row_bins(rows);
     for (int r = 0; r < rows; ++r) {
         const double f_hi = 1.0 - static_cast<double>(r) / rows;
@@ -186,31 +226,42 @@ void draw_spectrogram(cairo_t* cr, const Layout& l, const std::vector<int16_t>& 
         const int b1 = std::max(b0 + 1, static_cast<int>(f_hi * (bins - 1)));
         row_bins[r] = {b0, std::min(b1, bins)};
     }
+    return row_bins;
+}
+
+void draw_frequency_axis(cairo_t* cr, const Layout& l, uint32_t rate) {
+    const double nyquist_khz = rate / 2000.0;
+    const double step = nice_step(nyquist_khz, 6);
+    for (double f = 0; f <= nyquist_khz + 1e-9; f += step) {
+        const double y = l.spectro_y + l.spectro_h * (1.0 - f / nyquist_khz);
+        text(cr, l.left - 8, y + 4, tick_label(f, step), 11, kText, 1.0);
+    }
+    cairo_save(cr);
+    cairo_translate(cr, 16, l.spectro_y + l.spectro_h / 2);
+    cairo_rotate(cr, -std::numbers::pi / 2);
+    text(cr, 0, 0, "kHz", 12, kText, 0.5);
+    cairo_restore(cr);
+}
+
+/* Short-time spectrum of the channel mix, one Hann-windowed FFT per pixel column, linear
+ * frequency axis from 0 Hz (bottom) to half the sample rate (top); each pixel row shows the
+ * loudest bin of its range. */
+void draw_spectrogram(cairo_t* cr, const Layout& l, const std::vector<int16_t>& pcm, uint32_t rate,
+                      uint32_t channels, size_t frames) {
+    const int cols = static_cast<int>(l.plot_w);
+    const int rows = static_cast<int>(l.spectro_h);
+    if (cols < 1 || rows < 1) return;
+    Spectrum spectrum(rate >= 32000 ? 1024 : 512);
+    const std::vector<std::pair<int, int>> row_bins = row_bin_ranges(rows, spectrum.bins());
 
     cairo_surface_t* img = cairo_image_surface_create(CAIRO_FORMAT_RGB24, cols, rows);
     cairo_surface_flush(img);
     unsigned char* data = cairo_image_surface_get_data(img);
     const int stride = cairo_image_surface_get_stride(img);
-    std::vector<double> db(bins);
+    std::vector<double> db(spectrum.bins());
     for (int x = 0; x < cols; ++x) {
         const auto centre = static_cast<long long>((x + 0.5) * static_cast<double>(frames) / cols);
-        const long long first = centre - nfft / 2;
-        for (int i = 0; i < nfft; ++i) {
-            const long long f = first + i;
-            double v = 0;
-            if (f >= 0 && static_cast<size_t>(f) < frames) {
-                for (uint32_t c = 0; c < channels; ++c)
-                    v += pcm[static_cast<size_t>(f) * channels + c];
-                v /= 32768.0 * channels;
-            }
-            in[i] = v * window[i];
-        }
-        fftw_execute(plan);
-        for (int b = 0; b < bins; ++b) {
-            // A full-scale sine at a bin's centre reads 0 dB.
-            const double mag = std::hypot(spectrum[b][0], spectrum[b][1]) / (wsum / 2.0);
-            db[b] = 20.0 * std::log10(std::max(mag, 1e-12));
-        }
+        spectrum.levels(pcm, channels, frames, centre, db);
         for (int r = 0; r < rows; ++r) {
             double peak = kFloorDb;
             for (int b = row_bins[r].first; b < row_bins[r].second; ++b)
@@ -225,22 +276,7 @@ void draw_spectrogram(cairo_t* cr, const Layout& l, const std::vector<int16_t>& 
     cairo_set_source_surface(cr, img, l.left, l.spectro_y);
     cairo_paint(cr);
     cairo_surface_destroy(img);
-    fftw_destroy_plan(plan);
-    fftw_free(in);
-    fftw_free(spectrum);
-    fftw_cleanup();
-
-    const double nyquist_khz = rate / 2000.0;
-    const double step = nice_step(nyquist_khz, 6);
-    for (double f = 0; f <= nyquist_khz + 1e-9; f += step) {
-        const double y = l.spectro_y + l.spectro_h * (1.0 - f / nyquist_khz);
-        text(cr, l.left - 8, y + 4, tick_label(f, step), 11, kText, 1.0);
-    }
-    cairo_save(cr);
-    cairo_translate(cr, 16, l.spectro_y + l.spectro_h / 2);
-    cairo_rotate(cr, -std::numbers::pi / 2);
-    text(cr, 0, 0, "kHz", 12, kText, 0.5);
-    cairo_restore(cr);
+    draw_frequency_axis(cr, l, rate);
 }
 
 void draw_time_axis(cairo_t* cr, const Layout& l, double seconds) {

@@ -152,40 +152,37 @@ void start_watchdog(Counts& counts) {
     }).detach();
 }
 
-int run_play(PlayOptions& o) {
-    SetupOptions& setup = o.setup;
-    finish_setup(setup);
-    const KOVA_FORMAT fmt = setup.format.format();
-    const std::vector<TouchEvent> events = load_gesture(o.gesture, fmt.w, fmt.h);
-
-    static Counts counts; /* outlives this function: the watchdog may read it until the exit */
-    counts.total_events = events.size();
-    counts.capture = o.capture;
-    counts.start_ms = now_ms();
+/* SIGINT and SIGTERM end the playback early (the loop and the drain look at g_signal). */
+void catch_signals() {
     g_signal.store(0);
     struct sigaction sa {};
     sa.sa_handler = on_signal;
     sigaction(SIGINT, &sa, nullptr);
     sigaction(SIGTERM, &sa, nullptr);
-    start_watchdog(counts);
+}
 
+/* Without a sound device only a capture can play; with --capture the target file is created
+ * first, so a folder that cannot be written fails before any work. */
+std::unique_ptr<OutputFile> open_capture(const PlayOptions& o, Counts& counts) {
     char why[256] = "";
     const bool has_device = kova_host_alsa_probe(o.device.c_str(), why, sizeof why) == 0;
-    std::unique_ptr<OutputFile> capture_file;
-    if (o.capture) {
-        capture_file = std::make_unique<OutputFile>(*o.capture);
-        counts.capture_temp = capture_file->temp_path();
-        if (!has_device)
-            std::fprintf(info(), "no sound device (ALSA %s: %s); ", o.device.c_str(), why);
-        std::fprintf(info(), "capturing the stream to %s\n", o.capture->c_str());
-    } else if (!has_device) {
-        failure("no sound device (ALSA " + in_quotes(o.device) + ": " + why +
-                "); use --capture FILE to write the stream to a WAV file");
+    if (!o.capture) {
+        if (!has_device) {
+            failure("no sound device (ALSA " + in_quotes(o.device) + ": " + why +
+                    "); use --capture FILE to write the stream to a WAV file");
+        }
+        return nullptr;
     }
+    auto capture_file = std::make_unique<OutputFile>(*o.capture);
+    counts.capture_temp = capture_file->temp_path();
+    if (!has_device) std::fprintf(info(), "no sound device (ALSA %s: %s); ", o.device.c_str(), why);
+    std::fprintf(info(), "capturing the stream to %s\n", o.capture->c_str());
+    return capture_file;
+}
 
-    Engine engine(setup.format);
-    prepare_set(engine, setup);
-
+/* The host stand-in's sink for the stream: the capture buffer, or the ALSA device. */
+void choose_sink(const PlayOptions& o) {
+    char why[256] = "";
     if (o.capture) {
         kova_host_use_capture_sink();
         kova_host_capture_clear();
@@ -193,20 +190,13 @@ int run_play(PlayOptions& o) {
         failure("no sound device (ALSA " + in_quotes(o.device) + ": " + why + ")");
     }
     kova_host_reset_counters();
+}
 
-    Stream stream(
-        kova_open_fasttrack(static_cast<int>(fmt.sample_rate), static_cast<int>(fmt.channels)));
-    if (!stream) failure("the output stream could not be opened");
-    KOVA_FASTTRACK* ft = stream.get();
-
-    if (!o.capture) std::fprintf(info(), "playing on ALSA device %s\n", o.device.c_str());
-    std::fflush(info());
-    kova_start_fasttrack(ft);
+/* Each event at its time: generated, then written whole to the stream or counted as dropped. */
+void play_events(Engine& engine, KOVA_FASTTRACK* ft, const std::vector<TouchEvent>& events,
+                 int64_t start, Status& status, Counts& counts) {
     const int64_t t0 = events.front().time_ms;
-    const double bytes_per_ms = fmt.sample_rate * fmt.channels * 2 / 1000.0;
-    Status status{ft, bytes_per_ms, std::max<int64_t>(events.back().time_ms - t0, 1), counts};
     std::vector<int16_t> block(kBlockBytes / 2);
-    const int64_t start = counts.start_ms = now_ms();
     for (const TouchEvent& e : events) {
         wait_until(start + (e.time_ms - t0), start, status);
         if (g_signal.load()) break;
@@ -226,7 +216,10 @@ int run_play(PlayOptions& o) {
         ++counts.events;
         if (e.action == KOVA_ACTION_END) counts.stroke(false);
     }
-    // Let the device play out what is queued.
+}
+
+/* Lets the device play out what is queued, and says what it never took. */
+void drain(KOVA_FASTTRACK* ft, double bytes_per_ms, int64_t start, Status& status) {
     const int64_t drain_deadline =
         now_ms() + static_cast<int64_t>(ring_fill(ft) / bytes_per_ms) + kDrainSlackMs;
     while (!g_signal.load() && ring_fill(ft) > 0 && now_ms() < drain_deadline) {
@@ -237,6 +230,51 @@ int run_play(PlayOptions& o) {
     if (const uint32_t left = ring_fill(ft); left > 0 && !g_signal.load())
         note("the device stopped taking sound; " +
              std::to_string(static_cast<int>(left / bytes_per_ms)) + " ms never played");
+}
+
+/* Writes the captured stream to the --capture target. */
+void save_capture(OutputFile& capture_file, const std::string& target, const KOVA_FORMAT& fmt) {
+    if (kova_host_capture_write_wav(capture_file.temp_path().c_str(),
+                                    static_cast<int>(fmt.sample_rate),
+                                    static_cast<int>(fmt.channels)) != 0) {
+        failure("cannot write " + in_quotes(target) + ": the capture could not be saved");
+    }
+    capture_file.commit();
+    std::fprintf(info(), "wrote %s: %.3f s captured\n", target.c_str(),
+                 kova_host_capture_size() / (fmt.sample_rate * fmt.channels * 2.0));
+}
+
+int run_play(PlayOptions& o) {
+    SetupOptions& setup = o.setup;
+    finish_setup(setup);
+    const KOVA_FORMAT fmt = setup.format.format();
+    const std::vector<TouchEvent> events = load_gesture(o.gesture, fmt.w, fmt.h);
+
+    static Counts counts; /* outlives this function: the watchdog may read it until the exit */
+    counts.total_events = events.size();
+    counts.capture = o.capture;
+    counts.start_ms = now_ms();
+    catch_signals();
+    start_watchdog(counts);
+    std::unique_ptr<OutputFile> capture_file = open_capture(o, counts);
+
+    Engine engine(setup.format);
+    prepare_set(engine, setup);
+    choose_sink(o);
+    Stream stream(
+        kova_open_fasttrack(static_cast<int>(fmt.sample_rate), static_cast<int>(fmt.channels)));
+    if (!stream) failure("the output stream could not be opened");
+    KOVA_FASTTRACK* ft = stream.get();
+
+    if (!o.capture) std::fprintf(info(), "playing on ALSA device %s\n", o.device.c_str());
+    std::fflush(info());
+    kova_start_fasttrack(ft);
+    const int64_t t0 = events.front().time_ms;
+    const double bytes_per_ms = fmt.sample_rate * fmt.channels * 2 / 1000.0;
+    Status status{ft, bytes_per_ms, std::max<int64_t>(events.back().time_ms - t0, 1), counts};
+    const int64_t start = counts.start_ms = now_ms();
+    play_events(engine, ft, events, start, status, counts);
+    drain(ft, bytes_per_ms, start, status);
     counts.stroke(false);
     status.show(now_ms() - start);
     status.finish();
@@ -250,16 +288,7 @@ int run_play(PlayOptions& o) {
     kova_stop_fasttrack(ft);
     stream.reset();
     counts.report(0);
-    if (capture_file) {
-        if (kova_host_capture_write_wav(capture_file->temp_path().c_str(),
-                                        static_cast<int>(fmt.sample_rate),
-                                        static_cast<int>(fmt.channels)) != 0) {
-            failure("cannot write " + in_quotes(*o.capture) + ": the capture could not be saved");
-        }
-        capture_file->commit();
-        std::fprintf(info(), "wrote %s: %.3f s captured\n", o.capture->c_str(),
-                     kova_host_capture_size() / (fmt.sample_rate * fmt.channels * 2.0));
-    }
+    if (capture_file) save_capture(*capture_file, *o.capture, fmt);
     return kExitOk;
 }
 

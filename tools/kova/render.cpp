@@ -44,6 +44,34 @@ struct RenderOptions {
     PictureOptions picture;
 };
 
+/* Moves of a gesture, and those too short or too small to sound. */
+struct MoveCounts {
+    size_t all = 0;
+    size_t silent = 0;
+};
+
+/* Generates every event and places its block on the timeline at the event's time. */
+MoveCounts place_events(Engine& engine, const std::vector<TouchEvent>& events, Timeline& timeline) {
+    std::vector<int16_t> block(kBlockBytes / 2);
+    MoveCounts moves;
+    const size_t max_frames = static_cast<size_t>(kMaxRenderSeconds) * engine.format().sample_rate;
+    for (const TouchEvent& e : events) {
+        const int32_t bytes = generate_event(engine, e, block);
+        if (e.action == KOVA_ACTION_MOVE) {
+            ++moves.all;
+            if (bytes <= 0) ++moves.silent;
+        }
+        timeline.place(e.time_ms, e.action, block.data(),
+                       bytes > 0 ? static_cast<size_t>(bytes) / 2 : 0);
+        if (timeline.frames() > max_frames) {
+            failure("the sound would last longer than " + std::to_string(kMaxRenderSeconds) +
+                    " s (at the event at " + std::to_string(e.time_ms) +
+                    " ms); render shorter gestures");
+        }
+    }
+    return moves;
+}
+
 int run_render(RenderOptions& o) {
     SetupOptions& setup = o.setup;
     PictureOptions& picture = o.picture;
@@ -64,23 +92,7 @@ int run_render(RenderOptions& o) {
     prepare_set(engine, setup);
 
     Timeline timeline(fmt.sample_rate, fmt.channels);
-    std::vector<int16_t> block(kBlockBytes / 2);
-    size_t moves = 0, silent_moves = 0;
-    const size_t max_frames = static_cast<size_t>(kMaxRenderSeconds) * fmt.sample_rate;
-    for (const TouchEvent& e : events) {
-        const int32_t bytes = generate_event(engine, e, block);
-        if (e.action == KOVA_ACTION_MOVE) {
-            ++moves;
-            if (bytes <= 0) ++silent_moves;
-        }
-        timeline.place(e.time_ms, e.action, block.data(),
-                       bytes > 0 ? static_cast<size_t>(bytes) / 2 : 0);
-        if (timeline.frames() > max_frames) {
-            failure("the sound would last longer than " + std::to_string(kMaxRenderSeconds) +
-                    " s (at the event at " + std::to_string(e.time_ms) +
-                    " ms); render shorter gestures");
-        }
-    }
+    const MoveCounts moves = place_events(engine, events, timeline);
 
     write_wav(wav_file, timeline.pcm(), fmt.sample_rate, fmt.channels);
     if (png_file) {
@@ -94,7 +106,7 @@ int run_render(RenderOptions& o) {
     const double seconds = static_cast<double>(timeline.frames()) / fmt.sample_rate;
     std::fprintf(info(),
                  "gesture: %zu events, %zu moves, %zu of them too short or too small to sound\n",
-                 events.size(), moves, silent_moves);
+                 events.size(), moves.all, moves.silent);
     std::fprintf(info(), "wrote %s: %.3f s, %u Hz, %u channel%s, peak %.1f dBFS\n", output.c_str(),
                  seconds, fmt.sample_rate, fmt.channels, fmt.channels == 1 ? "" : "s",
                  peak_dbfs(timeline.pcm()));

@@ -147,56 +147,79 @@ std::string library_error(int32_t code) {
            " (library code " + std::to_string(code) + ")";
 }
 
+namespace {
+
+/* A saved set plays its samples as they are: at another format they play at another pitch. */
+void note_saved_format(const SourceOptions& src, const KOVA_FORMAT& fmt) {
+    const SavedFormat saved = check_source_set_file(src.set_path, src.slot[KOVA_SLOT_LOOP].empty());
+    if (saved.rate != static_cast<int32_t>(fmt.sample_rate) ||
+        saved.channels != static_cast<int32_t>(fmt.channels)) {
+        note(in_quotes(src.set_path) + " was saved for " + std::to_string(saved.rate) + " Hz, " +
+             std::to_string(saved.channels) + " channel(s); it plays at " +
+             std::to_string(fmt.sample_rate) + " Hz, " + std::to_string(fmt.channels) +
+             " channel(s)");
+    }
+}
+
+/* How a set is registered: its id, which filters are still to attach, and whether the given
+ * sound files then replace the registered slots. */
+struct Registration {
+    PreparedSet set;
+    size_t first_attached = 0;
+    bool replace_slots = false;
+};
+
+/* An id of 0 is a failure; each registration call presets `err`, read here only after the call
+ * (hence the reference: argument order is unspecified). */
+int32_t need(int32_t id, const int32_t& err, const std::string& what) {
+    if (id == 0) failure("cannot " + what + ": " + library_error(err));
+    return id;
+}
+
+/* The one registration the options ask for: the built-in set, a saved set, sound files or the
+ * first filter's noise. */
+Registration register_set(KOVA_CTX* ctx, const SourceOptions& src, const KOVA_FORMAT& fmt,
+                          const SlotPaths& paths) {
+    Registration r;
+    int32_t err = KOVA_OK;
+    if (src.builtin()) {
+        r.set.id = need(register_builtin_set(ctx, fmt, &err), err, "register the built-in set");
+        r.set.noise_loop = true;
+    } else if (!src.set_path.empty()) {
+        r.set.id = need(kova_reg_src_bysavefile(ctx, src.set_path.c_str(), &err), err,
+                        "register source-set file " + in_quotes(src.set_path));
+        r.replace_slots = paths.any;
+    } else if (!src.slot[KOVA_SLOT_LOOP].empty()) {
+        r.set.id =
+            need(kova_reg_src_byfiles(ctx, paths.ptr, &err), err, "register the sound files");
+    } else {
+        r.set.id = need(kova_reg_src_byfilter(ctx, &src.filters[0].dsc, &err), err,
+                        "register filter " + in_quotes(src.filters[0].text));
+        r.set.noise_loop = true;
+        r.first_attached = 1;
+        r.replace_slots = paths.any;
+    }
+    return r;
+}
+
+}  // namespace
+
 PreparedSet prepare_set(Engine& engine, const SetupOptions& setup) {
     const KOVA_FORMAT& fmt = engine.format();
     const SourceOptions& src = setup.source;
-    if (!src.set_path.empty()) {
-        const SavedFormat saved =
-            check_source_set_file(src.set_path, src.slot[KOVA_SLOT_LOOP].empty());
-        // The file's samples play as they are: at another format they play at another pitch.
-        if (saved.rate != static_cast<int32_t>(fmt.sample_rate) ||
-            saved.channels != static_cast<int32_t>(fmt.channels)) {
-            note(in_quotes(src.set_path) + " was saved for " + std::to_string(saved.rate) +
-                 " Hz, " + std::to_string(saved.channels) + " channel(s); it plays at " +
-                 std::to_string(fmt.sample_rate) + " Hz, " + std::to_string(fmt.channels) +
-                 " channel(s)");
-        }
-    }
+    if (!src.set_path.empty()) note_saved_format(src, fmt);
 
     ScratchDir scratch; /* kept until the filters are attached: they reload file sounds */
     const SlotPaths paths = slot_paths(src, fmt, scratch);
-
     KOVA_CTX* ctx = engine.ctx();
-    PreparedSet set;
-    int32_t err = KOVA_OK;
-    size_t first_attached = 0;
-    bool replace_slots = false;
-    // Each call presets `err`; an id of 0 is a failure.
-    const auto need = [&err](int32_t id, const std::string& what) {
-        if (id == 0) failure("cannot " + what + ": " + library_error(err));
-        return id;
-    };
-    if (src.builtin()) {
-        set.id = need(register_builtin_set(ctx, fmt, &err), "register the built-in set");
-        set.noise_loop = true;
-    } else if (!src.set_path.empty()) {
-        set.id = need(kova_reg_src_bysavefile(ctx, src.set_path.c_str(), &err),
-                      "register source-set file " + in_quotes(src.set_path));
-        replace_slots = paths.any;
-    } else if (!src.slot[KOVA_SLOT_LOOP].empty()) {
-        set.id = need(kova_reg_src_byfiles(ctx, paths.ptr, &err), "register the sound files");
-    } else {
-        set.id = need(kova_reg_src_byfilter(ctx, &src.filters[0].dsc, &err),
-                      "register filter " + in_quotes(src.filters[0].text));
-        set.noise_loop = true;
-        first_attached = 1;
-        replace_slots = paths.any;
-    }
+    Registration r = register_set(ctx, src, fmt, paths);
+    PreparedSet& set = r.set;
 
     KOVA_TUNE_SET base{};
     check(kova_get_tuneset(ctx, set.id, &base), "reading the tune set");
-    if (replace_slots) {
-        need(kova_update_src_byfiles(ctx, set.id, paths.ptr, &err),
+    int32_t err = KOVA_OK;
+    if (r.replace_slots) {
+        need(kova_update_src_byfiles(ctx, set.id, paths.ptr, &err), err,
              "load the start/loop/end sounds");
         if (paths.ptr[KOVA_SLOT_LOOP]) {
             // A new loop file takes the levels a file registration gives.
@@ -206,8 +229,8 @@ PreparedSet prepare_set(Engine& engine, const SetupOptions& setup) {
         // Otherwise the set keeps its levels: replacing only the start or end sound should not
         // change how loud the loop plays.
     }
-    for (size_t i = first_attached; i < src.filters.size(); ++i) {
-        need(kova_attach_filter(ctx, set.id, &src.filters[i].dsc, &err),
+    for (size_t i = r.first_attached; i < src.filters.size(); ++i) {
+        need(kova_attach_filter(ctx, set.id, &src.filters[i].dsc, &err), err,
              "attach filter " + in_quotes(src.filters[i].text));
     }
 

@@ -1,17 +1,15 @@
 // SPDX-License-Identifier: Apache-2.0
-/* Internal pieces shared by the generation files: the per-call block setup and the sample
- * finisher (equaliser, rotating clip values). Not exported.
- *
- * Include this header LAST: it brings in the exact-arithmetic settings of the signal blocks,
- * which apply to every function defined after it. */
-#ifndef KOVA_ENGINE_GENERATE_FINISH_H
-#define KOVA_ENGINE_GENERATE_FINISH_H
+/* The per-sample kernel of generation: what a call reads from the active set, the equaliser step
+ * held in registers, clipping with rotating replacement values, and the loop and start/end
+ * renderers built from them (generate_kernel.cpp). Not exported. */
+#ifndef KOVA_ENGINE_SAMPLE_KERNEL_H
+#define KOVA_ENGINE_SAMPLE_KERNEL_H
 
 #include <cstdint>
 
+#include "dsp/exact_math.h"
 #include "kova/kova_dsp.h"
 #include "kova/kova_types.h"
-#include "dsp/exact_math.h"
 
 /* Replacement values for clipped samples rotate through three steps per side. The counters are
  * shared by every context and rely on the callers being serialised. */
