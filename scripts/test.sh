@@ -108,9 +108,10 @@ if ! skipped tsan; then
         xargs -n1 basename | sed 's/\.cpp$//' | sort -u)
     cmake --build "$dir" -j "$jobs" --target "${tsan_targets[@]}" >"$dir.build.log" 2>&1 ||
         { tail -n 60 "$dir.build.log"; exit 1; }
-    # Every test of those suites runs (KOVA_TSAN_PATTERN narrows them to a ctest -R regex).
+    # Every test of those suites runs (KOVA_TSAN_PATTERN narrows them to a ctest -R regex). The
+    # fuzz replays are not built here: they start no threads and run in the other builds.
     (cd "$dir" && TSAN_OPTIONS="halt_on_error=1 second_deadlock_stack=1" \
-        ctest --output-on-failure -j "$jobs" --timeout 900 -E 'NOT_BUILT|exports_match_list' \
+        ctest --output-on-failure -j "$jobs" --timeout 900 -E 'NOT_BUILT|exports_match_list|fuzz_replay_' \
         ${KOVA_TSAN_PATTERN:+-R "$KOVA_TSAN_PATTERN"})
     stage_done "tsan build + threaded suites"
 fi
