@@ -5,6 +5,12 @@
 // slew limiter). Kept apart, the serial pass carries little besides the equaliser's own chain.
 #include <cstdint>
 
+#if defined(__SSE2__)
+#include <emmintrin.h>
+#elif defined(__aarch64__)
+#include <arm_neon.h>
+#endif
+
 #include "kova/kova_dsp.h"
 #include "dsp/dsp_internal.h"
 #include "engine/sample_kernel.h"
@@ -24,6 +30,35 @@ inline double eq_input(double v) {
     v = v < 2147483647.0 ? v : 2147483647.0;
     v = v > -2147483648.0 ? v : -2147483648.0;
     return static_cast<double>(static_cast<int32_t>(v));
+}
+
+// Every product of a chunk (in place) to its equaliser input, eq_input of each. The plain
+// conversion a vector unit offers differs from trunc_sat32 only where the product is NaN or out
+// of range, which gains of a usable level never produce: on x86 that conversion marks both cases
+// with INT32_MIN, and only a pair so marked takes the exact path (a product that truly truncates
+// to INT32_MIN takes it too, to the same result). AArch64's conversion saturates and takes NaN to
+// 0 by itself, which is trunc_sat32 exactly.
+void truncate_inputs(double* x, int64_t len) {
+    int64_t i = 0;
+#if defined(__SSE2__)
+    const __m128i marked = _mm_set1_epi32(INT32_MIN);
+    for (; i + 1 < len; i += 2) {
+        const __m128d v = _mm_loadu_pd(x + i);
+        const __m128i t = _mm_cvttpd_epi32(v);
+        if (_mm_movemask_epi8(_mm_cmpeq_epi32(t, marked)) & 0xFF) [[unlikely]] {
+            x[i] = eq_input(x[i]);
+            x[i + 1] = eq_input(x[i + 1]);
+        } else {
+            _mm_storeu_pd(x + i, _mm_cvtepi32_pd(t));
+        }
+    }
+#elif defined(__aarch64__)
+    for (; i + 1 < len; i += 2) {
+        const int32x2_t t = vqmovn_s64(vcvtq_s64_f64(vld1q_f64(x + i)));
+        vst1q_f64(x + i, vcvtq_f64_s64(vmovl_s32(t)));
+    }
+#endif
+    for (; i < len; ++i) x[i] = eq_input(x[i]);
 }
 
 // The equaliser's normalisation. Done in the serial pass, where the divider works beside the
@@ -100,7 +135,7 @@ void serial_pass_for(KOVA_EQ* keq, const double* x, int64_t len, int16_t* dst, P
 
 // First pass of a move over `len` samples of one stretch of the loop (no wrap inside): gain x
 // sample x envelope x oscillator x pan, in that order (factors that are 1.0 are left out, which
-// changes no bit), then truncation. `first` is the parity of the stretch's first sample.
+// changes no bit); truncate_inputs() follows. `first` is the parity of the stretch's first sample.
 template <bool kOsc, bool kPan>
 void products(const int16_t* src, double gain, const double pan_gain[2], const double* env,
               const double* o, double* x, int64_t len, int64_t first) {
@@ -108,7 +143,7 @@ void products(const int16_t* src, double gain, const double pan_gain[2], const d
         for (int64_t i = 0; i < len; ++i) {
             double v = gain * src[i] * env[i];
             if (kOsc) v = v * o[i];
-            x[i] = eq_input(v);
+            x[i] = v;
         }
         return;
     }
@@ -117,7 +152,7 @@ void products(const int16_t* src, double gain, const double pan_gain[2], const d
     if (first & 1) {
         double v = gain * src[0] * env[0];
         if (kOsc) v = v * o[0];
-        x[0] = eq_input(v * pan_gain[1]);
+        x[0] = v * pan_gain[1];
         i = 1;
     }
     const double pan_even = pan_gain[0];
@@ -129,13 +164,13 @@ void products(const int16_t* src, double gain, const double pan_gain[2], const d
             v0 = v0 * o[i];
             v1 = v1 * o[i + 1];
         }
-        x[i] = eq_input(v0 * pan_even);
-        x[i + 1] = eq_input(v1 * pan_odd);
+        x[i] = v0 * pan_even;
+        x[i + 1] = v1 * pan_odd;
     }
     if (i < len) {
         double v = gain * src[i] * env[i];
         if (kOsc) v = v * o[i];
-        x[i] = eq_input(v * pan_even);
+        x[i] = v * pan_even;
     }
 }
 
@@ -173,6 +208,7 @@ void loop_blocks(KOVA_EQ* eq, LoopRender& r, int16_t* dst, int64_t count) {
         const int64_t len = (count - done < kChunk) ? count - done : kChunk;
         if (kOsc) _osc_fill(r.osc, o, len);
         loop_products<kOsc, kPan>(r, env, o, x, len);
+        truncate_inputs(x, len);
         serial_pass_for<kPost>(eq, x, len, dst + done, ps, env, c, r.step);
     }
     r.mem_even = ps.mem[0];
@@ -214,7 +250,8 @@ void once_blocks(KOVA_EQ* eq, const int16_t* pcm, int64_t count, double gain,
         const int64_t len = (count - done < kChunk) ? count - done : kChunk;
         const int16_t* src = pcm + done;
         int16_t* out = dst + done;
-        for (int64_t i = 0; i < len; ++i) x[i] = eq_input(gain * src[i]);
+        for (int64_t i = 0; i < len; ++i) x[i] = gain * src[i];
+        truncate_inputs(x, len);
         serial_pass_for<Post::none, false>(eq, x, len, out, ps, nullptr, unused_c, 0.0);
         if (kPan) {
             int64_t i = 0;
