@@ -230,12 +230,6 @@ void loop_blocks_by_factors(KOVA_EQ* eq, LoopRender& r, int16_t* dst, int64_t co
     }
 }
 
-// A finished sample times its pan gain: truncated and saturated to 32 bits like trunc_sat32,
-// then its low 16 bits.
-inline int16_t pan_finished(int16_t s, double pan) {
-    return static_cast<int16_t>(static_cast<int32_t>(eq_input(s * pan)));
-}
-
 // Start and end sounds: first pass (gain, truncation), the serial pass, then with panning the
 // pan gain on the finished samples, which depends on nothing serial and runs vectorised.
 template <bool kPan>
@@ -254,12 +248,16 @@ void once_blocks(KOVA_EQ* eq, const int16_t* pcm, int64_t count, double gain,
         truncate_inputs(x, len);
         serial_pass_for<Post::none, false>(eq, x, len, out, ps, nullptr, unused_c, 0.0);
         if (kPan) {
+            // Each finished sample times the pan gain of its parity (chunks start on an even
+            // sample), truncated and saturated to 32 bits like trunc_sat32, then its low 16 bits.
             int64_t i = 0;
             for (; i + 1 < len; i += 2) {
-                out[i] = pan_finished(out[i], pan_even);
-                out[i + 1] = pan_finished(out[i + 1], pan_odd);
+                x[i] = out[i] * pan_even;
+                x[i + 1] = out[i + 1] * pan_odd;
             }
-            if (i < len) out[i] = pan_finished(out[i], pan_even);
+            if (i < len) x[i] = out[i] * pan_even;
+            truncate_inputs(x, len);
+            for (i = 0; i < len; ++i) out[i] = static_cast<int16_t>(static_cast<int32_t>(x[i]));
         }
     }
 }
