@@ -139,7 +139,8 @@ def main():
     started = time.time()
     print(f"baseline build in {build}", flush=True)
     if run(["cmake", "-S", tree, "-B", build, "-DCMAKE_BUILD_TYPE=RelWithDebInfo",
-            "-DKOVA_BUILD_BENCH=OFF", "-DKOVA_BUILD_DOCS=OFF"], tree, log) or \
+            "-DKOVA_BUILD_BENCH=OFF", "-DKOVA_BUILD_DOCS=OFF",
+            "-DKOVA_TEST_TIMEOUT=60"], tree, log) or \
             run(["cmake", "--build", build, "-j", args.jobs], tree, log):
         sys.exit(f"baseline build failed, see {log}")
     if run(["ctest", "-j", args.jobs, "--timeout", "300"], build, log):
@@ -174,7 +175,8 @@ def main():
                 failed_log = os.path.join(build, "Testing", "Temporary", "LastTestsFailed.log")
                 if os.path.exists(failed_log):
                     os.remove(failed_log)
-                # A minute is ample for any suite; a hang (a missed unlock) times out.
+                # A minute is ample for any suite (the build's per-test limit is set to it
+                # above); a hang (a missed unlock) times out.
                 rc = run(["ctest", "-j", args.jobs, "--timeout", "60"] +
                          (["--stop-on-failure"] if args.first else []), build, log)
                 if os.path.exists(failed_log):
