@@ -21,20 +21,15 @@ using namespace kova_fuzz;
 
 namespace {
 
-int32_t le32(const uint8_t* p) {
-    return static_cast<int32_t>(static_cast<uint32_t>(p[0]) | static_cast<uint32_t>(p[1]) << 8 |
-                                static_cast<uint32_t>(p[2]) << 16 |
-                                static_cast<uint32_t>(p[3]) << 24);
-}
-
 void check_tuneset(const char* path, const uint8_t* data, size_t size) {
     KOVA_TUNE_SET tune;
     std::memset(&tune, 0x5A, sizeof tune);
     const KOVA_TUNE_SET before = tune;
     FUZZ_CHECK(kova_get_tuneset_fromfile(path, &tune) == KOVA_OK);
     if (size < 4) return;
-    const int64_t n = le32(data);
-    const int64_t at = 4 + 40 * (n > 0 ? n : 0);
+    int32_t n = 0;
+    std::memcpy(&n, data, sizeof n);  // the files are little-endian, as the fuzzing machine
+    const int64_t at = 4 + 40 * static_cast<int64_t>(n > 0 ? n : 0);
     KOVA_TUNE_SET stored = before;
     if (static_cast<uint64_t>(at) < size) {
         const size_t held = std::min<size_t>(sizeof stored, size - static_cast<size_t>(at));

@@ -55,7 +55,7 @@ class Bytes {
 class ScratchFile {
    public:
     explicit ScratchFile(const char* tag);
-    ~ScratchFile();
+    ~ScratchFile() { remove(); }
     ScratchFile(const ScratchFile&) = delete;
     ScratchFile& operator=(const ScratchFile&) = delete;
     void rewrite(const void* data, size_t size) const;
@@ -94,12 +94,8 @@ class GuardedPcm {
 // nothing is allocated. Returns the byte count.
 int32_t checked_gen(KOVA_CTX* ctx, const KOVA_PARAM& ev, int32_t buffer_bytes);
 
-// A realistic stroke: down, `moves` moves `dt_ms` apart along a diagonal, up; each call checked.
-// Returns the total bytes produced.
-int64_t checked_stroke(KOVA_CTX* ctx, int moves, int dt_ms, int32_t buffer_bytes);
-
 // The usual engine format: 48000 Hz stereo with position panning on a 1080 x 2280 screen.
-KOVA_FORMAT phone_format();
+constexpr KOVA_FORMAT kPhoneFormat{48000, 2, 1, 1080, 2280};
 
 // One engine context kept across inputs: creating one per input costs more than most inputs.
 // A ReusedCtx hands it out exactly as kova_init left it (a different format replaces it), and on
@@ -121,9 +117,9 @@ class ReusedCtx {
 };
 
 // A short stroke for the targets whose subject is a file, not generation (which the generation
-// target covers): down, two moves 4 ms apart, up, with buffers of `buffer_bytes`. Enough to
-// show that a set read from the file plays within its bounds.
-int64_t short_stroke(KOVA_CTX* ctx, int32_t buffer_bytes = 256);
+// target covers): down, two moves 4 ms apart, up, with 256-byte buffers, each call checked.
+// Enough to show that a set read from the file plays within its bounds.
+void short_stroke(KOVA_CTX* ctx);
 
 // Bitwise equality of two records (so NaN payloads compare equal to themselves).
 template <typename T>
