@@ -112,15 +112,8 @@ struct PcmFiles {
     }
 };
 
-PcmFiles& pcm_files() {
-    static PcmFiles files;
-    return files;
-}
-
-SetCache& kept_sets() {
-    static SetCache sets;
-    return sets;
-}
+PcmFiles g_pcm_files;
+SetCache g_kept_sets;
 
 // Registers a set: the kept one for `key` when there is one, else `make()` (the library's
 // registration, or -1 when it is skipped), whose set is then kept. Not instrumented: which way
@@ -128,10 +121,10 @@ SetCache& kept_sets() {
 template <typename Make>
 __attribute__((no_sanitize("coverage"))) int32_t register_kept(KOVA_CTX* ctx,
                                                                const std::string& key, Make make) {
-    int32_t id = kept_sets().reuse(ctx, key);
+    int32_t id = g_kept_sets.reuse(ctx, key);
     if (id != 0) return id;
     id = make();
-    kept_sets().keep(ctx, id, key);
+    g_kept_sets.keep(ctx, id, key);
     return id;
 }
 
@@ -236,8 +229,8 @@ class Session {
             case kUpdate: {
                 const KOVA_FLT_DSC d = read_filter(in, format_);
                 if (!costly()) break;
-                pcm_files().sync();  // a file set reads its files again
-                kept_sets().edited();
+                g_pcm_files.sync();  // a file set reads its files again
+                g_kept_sets.edited();
                 (op == kAttach ? kova_attach_filter : kova_update_filter)(ctx_, count, &d, &err);
                 break;
             }
@@ -286,13 +279,13 @@ void register_files(Bytes& in, KOVA_CTX* ctx, const KOVA_FORMAT& f) {
     const size_t lengths[KOVA_SLOT_COUNT] = {in.take<uint16_t>(), in.take<uint16_t>() * size_t{4},
                                              in.take<uint16_t>()};
     const uint8_t amplitude = in.take<uint8_t>();
-    std::memcpy(pcm_files().wanted, lengths, sizeof lengths);
-    pcm_files().amplitude = amplitude;
+    std::memcpy(g_pcm_files.wanted, lengths, sizeof lengths);
+    g_pcm_files.amplitude = amplitude;
     const std::string key = "files" + key_bytes(f) + key_bytes(lengths) + key_bytes(amplitude);
     const int32_t id = register_kept(ctx, key, [&] {
-        pcm_files().sync();
+        g_pcm_files.sync();
         int32_t err = 0;
-        return kova_reg_src_byfiles(ctx, pcm_files().paths, &err);
+        return kova_reg_src_byfiles(ctx, g_pcm_files.paths, &err);
     });
     FUZZ_CHECK((id == 1) == (lengths[KOVA_SLOT_LOOP] > 0));
 }
@@ -322,7 +315,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     // The kept sets leave the context before it is reset (locals end in reverse order).
     struct Release {
         KOVA_CTX* ctx;
-        ~Release() { kept_sets().release(ctx); }
+        ~Release() { g_kept_sets.release(ctx); }
     } const release{ctx};
     int32_t err = 0;
 

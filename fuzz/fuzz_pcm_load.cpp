@@ -81,7 +81,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     }
     // The rest of the input, repeated; a byte of 0 stands in for an empty rest.
     size_t pattern_len = 0;
-    const uint8_t* pattern = in.span(in.left(), &pattern_len);
+    const uint8_t* pattern = in.span(SIZE_MAX, &pattern_len);
     static const uint8_t kZero = 0;
     if (pattern_len == 0) {
         pattern = &kZero;

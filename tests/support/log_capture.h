@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-/* Records what the library sends to the Android log, for tests. */
+// Records what the library sends to the Android log, for tests.
 #ifndef KOVA_TEST_LOG_CAPTURE_H
 #define KOVA_TEST_LOG_CAPTURE_H
 
@@ -16,8 +16,8 @@ struct LogLine {
     bool operator==(const LogLine&) const = default;
 };
 
-/* While an instance lives, every log line of the process (any thread, any priority) is recorded
- * instead of printed; the record starts empty. One instance at a time. */
+// While an instance lives, every log line of the process (any thread, any priority) is recorded
+// instead of printed; the record starts empty. One instance at a time.
 class LogCapture {
    public:
     LogCapture();
@@ -26,7 +26,7 @@ class LogCapture {
     LogCapture& operator=(const LogCapture&) = delete;
 
     std::vector<LogLine> lines() const;
-    /* Messages of one tag, in order. */
+    // Messages of one tag, in order.
     std::vector<std::string> messages(const std::string& tag) const;
     void clear();
 };
