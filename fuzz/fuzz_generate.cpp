@@ -295,17 +295,11 @@ void register_files(Bytes& in, KOVA_CTX* ctx, const KOVA_FORMAT& f) {
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     Bytes in(data, size);
     const uint8_t flags = in.take<uint8_t>();
-    KOVA_FORMAT f{};
-    f.sample_rate = kRates[flags & kFmtRateMask];
-    f.channels = (flags & kFmtMono) ? 1 : 2;
-    f.p = (flags & kFmtPan) ? 1 : 0;
-    f.w = in.take<uint16_t>();
-    f.h = in.take<uint16_t>();
-    if (flags & kFmtRaw) {
-        f.sample_rate = in.take<uint32_t>();
-        f.channels = in.take<uint32_t>();
-        f.p = in.take<uint32_t>();
-    }
+    // Braced lists read their operands in order.
+    KOVA_FORMAT f{kRates[flags & kFmtRateMask], (flags & kFmtMono) ? 1u : 2u,
+                  (flags & kFmtPan) ? 1u : 0u, in.take<uint16_t>(), in.take<uint16_t>()};
+    if (flags & kFmtRaw)
+        f = {in.take<uint32_t>(), in.take<uint32_t>(), in.take<uint32_t>(), f.w, f.h};
     const ReusedCtx engine(f);
     KOVA_CTX* ctx = engine.get();
     if (ctx == nullptr) {
@@ -321,9 +315,8 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
 
     // 0, 1, 2 as above; any other value means files (a noise source costs about a
     // millisecond to make, so random kinds must not turn most inputs into filter inputs).
-    const uint8_t kind_byte = in.take<uint8_t>();
-    const uint8_t kind = kind_byte <= kSourceBoth ? kind_byte : uint8_t{kSourceFiles};
-    if (kind == kSourceFiles || kind == kSourceBoth) register_files(in, ctx, f);
+    const uint8_t kind = in.take<uint8_t>();
+    if (kind != kSourceFilter) register_files(in, ctx, f);
     bool made_noise = false;
     if (kind == kSourceFilter || kind == kSourceBoth) {
         const KOVA_FLT_DSC d = read_filter(in, f);

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "fuzz_support.h"
 
+#include <fcntl.h>
 #include <sanitizer/asan_interface.h>  // the poisoning macros do nothing without ASan
 #include <unistd.h>
 
@@ -46,11 +47,15 @@ void ScratchFile::remove() const {
 void ScratchFile::rewrite(const void* data, size_t size) const {
     // Overwrite, then cut: pages a same-sized file already has are reused, not freed and
     // zeroed again.
-    FILE* f = std::fopen(path_.c_str(), "r+b");
-    if (f == nullptr) f = std::fopen(path_.c_str(), "wb");
-    FUZZ_CHECK(f != nullptr && std::fwrite(data, 1, size, f) == size && std::fflush(f) == 0);
-    FUZZ_CHECK(ftruncate(fileno(f), static_cast<off_t>(size)) == 0);
-    std::fclose(f);
+    const int fd = open(path_.c_str(), O_WRONLY | O_CREAT, 0600);
+    FUZZ_CHECK(fd >= 0);
+    const auto* p = static_cast<const uint8_t*>(data);
+    for (ssize_t n = 0; size > 0; p += n, size -= static_cast<size_t>(n)) {
+        n = write(fd, p, size);
+        FUZZ_CHECK(n > 0);
+    }
+    FUZZ_CHECK(ftruncate(fd, lseek(fd, 0, SEEK_CUR)) == 0);
+    close(fd);
 }
 
 std::string ScratchFile::read() const {

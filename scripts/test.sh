@@ -125,18 +125,16 @@ if ! skipped fuzz; then
     cmake --build "$dir" -j "$jobs" --target kova_fuzz_all >"$dir.build.log" 2>&1 ||
         { tail -n 60 "$dir.build.log"; exit 1; }
     fuzz_seconds=${KOVA_FUZZ_SECONDS:-60}
-    # target:inputs:largest input to generate. One corpus and one regressions folder per kind of
-    # input: both set-file targets read srcset_file. File inputs are chunked (fuzz/file_script.h)
-    # and PCM inputs give lengths, so short inputs reach every slot limit.
-    for entry in srcset_file:srcset_file:16384 file_queries:srcset_file:16384 \
-        pcm_load:pcm_load:8192 generate:generate:2048; do
-        IFS=: read -r target input max_len <<<"$entry"
+    # target:largest input to generate. File inputs are chunked (fuzz/file_script.h) and PCM
+    # inputs give lengths, so short inputs reach every slot limit.
+    for entry in srcset_file:16384 pcm_load:8192 generate:2048; do
+        IFS=: read -r target max_len <<<"$entry"
         bin=$dir/fuzz/kova_fuzz_$target
         work=$dir/corpus/$target
         artifacts=$dir/artifacts/$target
         mkdir -p "$work" "$artifacts"
-        replay=("fuzz/corpus/$input")
-        [ -d "fuzz/regressions/$input" ] && replay+=("fuzz/regressions/$input")
+        replay=("fuzz/corpus/$target")
+        [ -d "fuzz/regressions/$target" ] && replay+=("fuzz/regressions/$target")
         # Every seed and every saved crash input must pass, then the target is fuzzed.
         "$bin" -runs=0 -close_fd_mask=1 -rss_limit_mb=3072 "${replay[@]}" >"$dir/replay-$target.log" 2>&1 ||
             { grep -v '^kova' "$dir/replay-$target.log" | tail -n 60; exit 1; }
