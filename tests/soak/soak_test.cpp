@@ -79,27 +79,19 @@ struct Fnv {
 // finds the stream not yet marked playing right after start() leaves the burst as the device
 // handed it over, which the host device plays as silence; generated sound never holds a burst
 // of exact zeros, so no generated data can hide there.
-struct DeviceLog {
-    std::mutex lock;
-    Fnv received;
-    unsigned long silent_bursts = 0;
-};
-std::vector<std::unique_ptr<DeviceLog>> g_devices;  // in track creation order; outlive the tracks
-
-class LoggingSink final : public kova_host::AudioSink {
-   public:
-    explicit LoggingSink(DeviceLog* log) : log_(log) {}
+struct DeviceLog final : kova_host::AudioSink {
     void write(const void* data, size_t bytes) override {
         const auto* p = static_cast<const uint8_t*>(data);
         const bool silent =
             bytes == kBurstBytes && std::all_of(p, p + bytes, [](uint8_t b) { return b == 0; });
-        std::lock_guard<std::mutex> guard(log_->lock);
-        silent ? void(++log_->silent_bursts) : log_->received.add(data, bytes);
+        std::lock_guard<std::mutex> guard(lock);
+        silent ? void(++silent_bursts) : received.add(data, bytes);
     }
-
-   private:
-    DeviceLog* log_;
+    std::mutex lock;
+    Fnv received;
+    unsigned long silent_bursts = 0;
 };
+std::vector<DeviceLog*> g_devices;  // in track creation order, owned by the tracks
 
 long resident_bytes() {
     long pages = 0, resident = 0;
@@ -127,7 +119,7 @@ using Counts = std::array<unsigned long, kBytes + 1>;
 class Producer {
    public:
     Producer(int i, jlong id, const std::vector<std::string>& paths, Clock::time_point t0)
-        : id_(id), device_(g_devices[i].get()), rng_(1234u + i), t0_(t0), inst_(instance(id)) {
+        : id_(id), device_(g_devices[i]), rng_(1234u + i), t0_(t0), inst_(instance(id)) {
         for (int slot = 0; slot < 3; ++slot) paths_[slot].utf = paths[slot];
     }
 
@@ -276,8 +268,9 @@ TEST(Soak, InstancesStreamStrokesWithoutLossUnderrunOrGrowth) {
                                             files.write("loop.pcm", kSlotBytes[1], 220.0),
                                             files.write("end.pcm", kSlotBytes[2], 440.0)};
     kova_host::use_sink_factory([](uint32_t, uint32_t) -> std::unique_ptr<kova_host::AudioSink> {
-        g_devices.push_back(std::make_unique<DeviceLog>());
-        return std::make_unique<LoggingSink>(g_devices.back().get());
+        auto device = std::make_unique<DeviceLog>();
+        g_devices.push_back(device.get());
+        return device;
     });
     ASSERT_EQ(JNI_OnLoad(fake_jni::vm(), nullptr), JNI_VERSION_1_6);
     std::vector<jlong> ids;
@@ -323,9 +316,9 @@ TEST(Soak, InstancesStreamStrokesWithoutLossUnderrunOrGrowth) {
         EXPECT_LE(resident_after - resident_before,
                   static_cast<long>(total[kRegs]) * kSetBytes + (24L << 20));
     }
-    for (jlong id : ids) EXPECT_EQ(jni_test::deinit(id), 0);
     unsigned long silent = 0;
-    for (const auto& d : g_devices) silent += d->silent_bursts;
+    for (const DeviceLog* d : g_devices) silent += d->silent_bursts;
+    for (jlong id : ids) EXPECT_EQ(jni_test::deinit(id), 0);
     std::printf(
         "soak: %d s, %d instances, %lu events, %lu strokes (%lu with the producer keeping up), "
         "%lu registrations, %lu drains, %.1f MB streamed, resident %+ld KB, host underruns %lu of "
