@@ -77,15 +77,14 @@ __attribute__((no_sanitize("coverage", "address", "undefined"))) void make_pcm(u
     if (bytes % 2) out[bytes - 1] = 0x11;
 }
 
+// A filter record (u8 type, f32 freq, f32 bandwidth, u8 enable) for the engine's format.
 KOVA_FLT_DSC read_filter(Bytes& in, const KOVA_FORMAT& f) {
-    KOVA_FLT_DSC d{};
-    d.type = in.take<uint8_t>();
-    d.freq = in.take<float>();
-    d.bandwidth = in.take<float>();
-    d.enable = in.take<uint8_t>();
-    d.samplerate = static_cast<int32_t>(f.sample_rate);
-    d.channels = static_cast<int32_t>(f.channels);
-    return d;
+    return {in.take<uint8_t>(),
+            in.take<float>(),
+            in.take<float>(),
+            in.take<uint8_t>(),
+            static_cast<int32_t>(f.sample_rate),
+            static_cast<int32_t>(f.channels)};
 }
 
 // The three PCM files of a file source. Their content follows from the lengths and amplitude
