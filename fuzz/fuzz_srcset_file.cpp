@@ -8,8 +8,9 @@
 // (or -2 when memory runs out); outputs of absent items stay as the caller set them; the tune set
 // equals the record decoded here from the raw bytes (the caller's bytes where the file ends),
 // with the gain adjustment applied; a registration either succeeds with identifier 1 and error 0
-// or fails with a documented code and registers nothing; every generation result is a whole byte
-// count within the buffer; a saved set reads back to a set that saves to the very same bytes.
+// or fails with a documented code and registers nothing; repeat points lie within their sound;
+// every generation result is a whole byte count within the buffer; a saved set reads back to a
+// set that saves to the very same bytes.
 #include <algorithm>
 #include <cmath>
 #include <cstddef>
@@ -111,7 +112,11 @@ void play_and_resave(KOVA_CTX* ctx, const ScratchFile& saved, const ScratchFile&
     KOVA_FLT_DSC flt[KOVA_FLT_TYPE_COUNT] = {};
     kova_get_filters(ctx, 1, flt);
     KOVA_RPT_INFO rpt{};
-    kova_get_rptinfo(ctx, 1, &rpt);
+    FUZZ_CHECK(kova_get_rptinfo(ctx, 1, &rpt) == KOVA_OK);
+    for (int slot = 0; slot < KOVA_SLOT_COUNT; ++slot) {  // within the sound; -1 when absent
+        FUZZ_CHECK(-1 <= rpt.rpt_start_ms[slot] && rpt.rpt_start_ms[slot] <= rpt.len_ms[slot]);
+        FUZZ_CHECK(-1 <= rpt.rpt_end_ms[slot] && rpt.rpt_end_ms[slot] <= rpt.len_ms[slot]);
+    }
     FUZZ_CHECK(kova_set_active_src(ctx, 1) == KOVA_OK);
     short_stroke(ctx);
 
