@@ -317,7 +317,10 @@ TEST(Soak, InstancesStreamStrokesWithoutLossUnderrunOrGrowth) {
                   static_cast<long>(total[kRegs]) * kSetBytes + (24L << 20));
     }
     unsigned long silent = 0;
-    for (const DeviceLog* d : g_devices) silent += d->silent_bursts;
+    for (DeviceLog* d : g_devices) {
+        std::lock_guard<std::mutex> guard(d->lock);  // the device threads still run
+        silent += d->silent_bursts;
+    }
     for (jlong id : ids) EXPECT_EQ(jni_test::deinit(id), 0);
     std::printf(
         "soak: %d s, %d instances, %lu events, %lu strokes (%lu with the producer keeping up), "
