@@ -109,6 +109,7 @@ bool registered(KOVA_CTX* ctx, const char* path) {
 void play_and_resave(KOVA_CTX* ctx, const ScratchFile& saved, const ScratchFile& resaved) {
     KOVA_TUNE_SET tune{};
     FUZZ_CHECK(kova_get_tuneset(ctx, 1, &tune) == KOVA_OK);
+    FUZZ_CHECK(tune.wn_gain == 0.0);  // sources read back are file sources: no noise level
     KOVA_FLT_DSC flt[KOVA_FLT_TYPE_COUNT] = {};
     kova_get_filters(ctx, 1, flt);
     KOVA_RPT_INFO rpt{};
