@@ -55,7 +55,7 @@ Bytes pcm(int slot) {
 
 // Little-endian encoders, independent of the host's byte order and struct layout.
 void put(Bytes& b, uint64_t v, int bytes) {
-    for (int i = 0; i < bytes; ++i) b.push_back(static_cast<uint8_t>(v >> (8 * i)));
+    for (int i = 0; i < bytes; ++i) b.push_back(i < 8 ? static_cast<uint8_t>(v >> (8 * i)) : 0);
 }
 void put_i32(Bytes& b, int32_t v) {
     put(b, static_cast<uint32_t>(v), 4);
