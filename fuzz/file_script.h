@@ -14,6 +14,7 @@
 #ifndef KOVA_FUZZ_FILE_SCRIPT_H
 #define KOVA_FUZZ_FILE_SCRIPT_H
 
+#include <algorithm>
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
@@ -62,17 +63,14 @@ __attribute__((no_sanitize("coverage"))) inline std::vector<uint8_t> expand_file
     };
     while (at < size && file.size() < kMaxFileBytes) {
         const uint8_t op = data[at++];
-        size_t room = kMaxFileBytes - file.size();
+        const size_t room = kMaxFileBytes - file.size();
         if (op != kRunOp) {
-            size_t n = take(2);
-            n = n < size - at ? n : size - at;
-            n = n < room ? n : room;
+            const size_t n = std::min<size_t>({take(2), size - at, room});  // in this order
             file.insert(file.end(), data + at, data + at + n);
             at += n;
         } else {
-            size_t n = take(3) % kMaxRunBytes;
+            const size_t n = std::min<size_t>(take(3) % kMaxRunBytes, room);
             const auto seed = static_cast<uint8_t>(take(1));
-            n = n < room ? n : room;
             uint8_t period[kRunPeriod];
             for (size_t i = 0; i < kRunPeriod; ++i) period[i] = run_byte(i, seed);
             const size_t base = file.size();
@@ -82,34 +80,6 @@ __attribute__((no_sanitize("coverage"))) inline std::vector<uint8_t> expand_file
     }
     return file;
 }
-
-// Writes an input in this language (for the seed generator and the regression inputs).
-class FileScript {
-   public:
-    FileScript& literal(const void* bytes, size_t n) {
-        const auto* p = static_cast<const uint8_t*>(bytes);
-        while (n > 0) {
-            const size_t part = n < 0xFFFF ? n : 0xFFFF;
-            out_.push_back(0);
-            out_.push_back(static_cast<uint8_t>(part & 0xFF));
-            out_.push_back(static_cast<uint8_t>(part >> 8));
-            out_.insert(out_.end(), p, p + part);
-            p += part;
-            n -= part;
-        }
-        return *this;
-    }
-    FileScript& run(uint32_t n, uint8_t seed) {
-        out_.push_back(kRunOp);
-        for (int k = 0; k < 3; ++k) out_.push_back(static_cast<uint8_t>(n >> (8 * k)));
-        out_.push_back(seed);
-        return *this;
-    }
-    const std::vector<uint8_t>& bytes() const { return out_; }
-
-   private:
-    std::vector<uint8_t> out_;
-};
 
 }  // namespace kova_fuzz
 

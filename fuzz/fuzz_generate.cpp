@@ -1,7 +1,20 @@
 // SPDX-License-Identifier: Apache-2.0
 // Motion events, tune sets, thickness and volume values and set management decoded from the
-// input (see event_script.h) and run through kova_gen_sounds with output buffers of every size.
-// One engine context serves every input of the same format (reset in between).
+// input and run through kova_gen_sounds with output buffers of every size. One engine context
+// serves every input of the same format (reset in between).
+//
+// Input layout (all values in machine byte order):
+//   header   u8 format flags (kFmt*), u16 w, u16 h, [raw: u32 rate, u32 channels, u32 p]
+//   source   u8 kind (0 files, 1 filter, 2 both, above 2 files), then per kind:
+//            files:  u16 start bytes, u16 loop bytes (x4), u16 end bytes, u8 amplitude
+//            filter: a filter record (u8 type, f32 freq, f32 bandwidth, u8 enable)
+//   ops      until the input ends: u8 opcode (modulo 8), then its operands:
+//            0..3 event: u8 flags (kEv*), x and y (raw f32 or i16 steps), time (raw i64 or u8
+//                 step in ms), u8 buffer size selector (see buffer_size);
+//            4 tune set: u8 raw?; raw: the record's image; else 11 scaled bytes;
+//            5 thickness, 6 volume: u8 raw?; raw: f64; else u8 scaled to -0.1..1.1;
+//            7 set management: u8 sub-op (AdminOp), its operands.
+// fuzz/corpus/generate holds scripts of realistic strokes in this layout.
 //
 // Properties: no crash or undefined behaviour for any value (NaN and infinite coordinates and
 // gains included); every result is a whole, non-negative byte count that fits the buffer;
@@ -12,7 +25,6 @@
 #include <cstring>
 #include <string>
 
-#include "event_script.h"
 #include "fuzz_support.h"
 #include "set_cache.h"
 
@@ -20,103 +32,98 @@ using namespace kova_fuzz;
 
 namespace {
 
+constexpr uint8_t kFmtRateMask = 0x07;  // index into kRates
+constexpr uint8_t kFmtMono = 0x08;
+constexpr uint8_t kFmtPan = 0x10;
+constexpr uint8_t kFmtRaw = 0x20;  // rate, channels and p follow as raw u32 values
+constexpr uint32_t kRates[8] = {8000, 11025, 16000, 22050, 24000, 32000, 44100, 48000};
+constexpr uint8_t kEvActionMask = 0x03;  // 3: a raw u32 action follows
+constexpr uint8_t kEvRawXY = 0x04;
+constexpr uint8_t kEvRawTime = 0x08;
+enum SourceKind : uint8_t { kSourceFiles = 0, kSourceFilter = 1, kSourceBoth = 2 };
+enum Op : uint8_t { kOpTune = 4, kOpThickness = 5, kOpVolume = 6, kOpAdmin = 7, kOpCount = 8 };
+// Operands: select i8 identifier; the filter ones a filter record; repeat i16 x 9 (len, start,
+// end ms per slot); resave none (saves the active set and registers the file again).
+enum AdminOp : uint8_t { kSelect, kRegFilter, kAttach, kUpdate, kRepeat, kResave, kAdminCount };
+
+// Buffer size selector: < 16 the size itself, < 0xF0 a multiple of 80 plus 0..3, else a u32
+// modulo 1000001 follows.
+int32_t buffer_size(Bytes& in) {
+    const auto sel = in.take<uint8_t>();
+    if (sel < 16) return sel;
+    if (sel < 0xF0) return (sel - 16) * 80 + (sel & 3);
+    return static_cast<int32_t>(in.take<uint32_t>() % 1000001u);
+}
+
 double scaled(uint8_t b, double lo, double hi) {
     return lo + (hi - lo) * b / 255.0;
 }
 
 // Deterministic PCM for a file source: a ramp with a little noise; amplitude 255 gives a
 // full-scale square wave that drives the clipper. Written to `out` (`bytes` long). Neither
-// instrumented nor checked: a per-sample loop of the harness, not of the library, and the ramp is
-// a table per amplitude, so the up to 131070 samples of a loop file cost little.
+// instrumented nor checked: a per-sample loop of the harness, not of the library.
 __attribute__((no_sanitize("coverage", "address", "undefined"))) void make_pcm(uint8_t* out,
                                                                                size_t bytes,
                                                                                uint8_t amplitude,
                                                                                uint32_t seed) {
-    int32_t ramp[200];
-    for (int32_t j = 0; j < 200; ++j) ramp[j] = (j * 300 - 30000) * amplitude / 255;
-    uint32_t x = seed | 1;
-    size_t phase = 0;
+    uint32_t x = seed;
     for (size_t n = 0; n < bytes / 2; ++n) {
-        x ^= x << 13;
-        x ^= x >> 17;
-        x ^= x << 5;
-        int32_t v;
-        if (amplitude == 255) {
-            v = (n / 37) % 2 ? 32767 : -32768;
-        } else {
-            v = ramp[phase] + static_cast<int32_t>(x % 512) - 256;
-        }
-        if (++phase == 200) phase = 0;
-        const auto s = static_cast<int16_t>(v < -32768 ? -32768 : (v > 32767 ? 32767 : v));
+        x = x * 1664525u + 1013904223u;
+        const int32_t ramp = (static_cast<int32_t>(n % 200) * 300 - 30000) * amplitude / 255;
+        const int32_t square = (n / 37) % 2 ? 32767 : -32768;
+        const auto s = static_cast<int16_t>(amplitude == 255 ? square : ramp + (x >> 23) - 256);
         std::memcpy(out + 2 * n, &s, 2);
     }
     if (bytes % 2) out[bytes - 1] = 0x11;
 }
 
+// A filter record (u8 type, f32 freq, f32 bandwidth, u8 enable) for the engine's format.
 KOVA_FLT_DSC read_filter(Bytes& in, const KOVA_FORMAT& f) {
-    KOVA_FLT_DSC d{};
-    d.type = in.take<uint8_t>();
-    d.freq = in.take<float>();
-    d.bandwidth = in.take<float>();
-    d.enable = in.take<uint8_t>();
-    d.samplerate = static_cast<int32_t>(f.sample_rate);
-    d.channels = static_cast<int32_t>(f.channels);
-    return d;
+    return {in.take<uint8_t>(),
+            in.take<float>(),
+            in.take<float>(),
+            in.take<uint8_t>(),
+            static_cast<int32_t>(f.sample_rate),
+            static_cast<int32_t>(f.channels)};
 }
 
 // The three PCM files of a file source. Their content follows from the lengths and amplitude
 // an input gives; they are written only when the library is about to read them (a registration
 // the cache does not serve, a filter change that reloads them) and differ from what is on disk.
-class PcmFiles {
-   public:
-    void want(const size_t (&lengths)[KOVA_SLOT_COUNT], uint8_t amplitude) {
-        std::memcpy(wanted_, lengths, sizeof wanted_);
-        amplitude_ = amplitude;
-    }
+struct PcmFiles {
+    const ScratchFile files[KOVA_SLOT_COUNT] = {ScratchFile("gen-start"), ScratchFile("gen-loop"),
+                                                ScratchFile("gen-end")};
+    const char* paths[KOVA_SLOT_COUNT] = {files[0].path(), files[1].path(), files[2].path()};
+    size_t wanted[KOVA_SLOT_COUNT] = {};
+    size_t written[KOVA_SLOT_COUNT] = {SIZE_MAX, SIZE_MAX, SIZE_MAX};
+    uint8_t amplitude = 0;
+    uint8_t written_amplitude = 0;
+
     void sync() {
         static uint8_t pcm[size_t{UINT16_MAX} * 4];
         for (int slot = 0; slot < KOVA_SLOT_COUNT; ++slot) {
-            if (written_[slot] == wanted_[slot] && written_amplitude_ == amplitude_) continue;
-            make_pcm(pcm, wanted_[slot], amplitude_, 7u + slot);
-            files_[slot].rewrite(pcm, wanted_[slot]);
-            written_[slot] = wanted_[slot];
+            if (written[slot] == wanted[slot] && written_amplitude == amplitude) continue;
+            make_pcm(pcm, wanted[slot], amplitude, 7u + slot);
+            files[slot].rewrite(pcm, wanted[slot]);
+            written[slot] = wanted[slot];
         }
-        written_amplitude_ = amplitude_;
+        written_amplitude = amplitude;
     }
-    const char* const* paths() {
-        for (int slot = 0; slot < KOVA_SLOT_COUNT; ++slot) paths_[slot] = files_[slot].path();
-        return paths_;
-    }
-
-   private:
-    const ScratchFile files_[KOVA_SLOT_COUNT] = {ScratchFile("gen-start"), ScratchFile("gen-loop"),
-                                                 ScratchFile("gen-end")};
-    size_t wanted_[KOVA_SLOT_COUNT] = {};
-    size_t written_[KOVA_SLOT_COUNT] = {SIZE_MAX, SIZE_MAX, SIZE_MAX};
-    uint8_t amplitude_ = 0;
-    uint8_t written_amplitude_ = 0;
-    const char* paths_[KOVA_SLOT_COUNT] = {};
 };
 
-PcmFiles& pcm_files() {
-    static PcmFiles files;
-    return files;
-}
-
-SetCache& kept_sets() {
-    static SetCache sets;
-    return sets;
-}
+PcmFiles g_pcm_files;
+SetCache g_kept_sets;
 
 // Registers a set: the kept one for `key` when there is one, else `make()` (the library's
 // registration, or -1 when it is skipped), whose set is then kept. Not instrumented: which way
 // it went is the cache's business, not behaviour of the library.
 template <typename Make>
-__attribute__((no_sanitize("coverage"))) int32_t register_kept(KOVA_CTX* ctx, const std::string& key, Make make) {
-    int32_t id = kept_sets().reuse(ctx, key);
+__attribute__((no_sanitize("coverage"))) int32_t register_kept(KOVA_CTX* ctx,
+                                                               const std::string& key, Make make) {
+    int32_t id = g_kept_sets.reuse(ctx, key);
     if (id != 0) return id;
     id = make();
-    kept_sets().keep(ctx, id, key);
+    g_kept_sets.keep(ctx, id, key);
     return id;
 }
 
@@ -146,8 +153,7 @@ class Session {
             return static_cast<int64_t>(static_cast<uint64_t>(last_.time) + in.take<uint8_t>());
         };
         ev.time = (flags & kEvRawTime) ? in.take<int64_t>() : step();
-        const auto sel = in.take<uint8_t>();
-        int32_t size = decode_buffer_size(sel, sel >= 0xF0 ? in.take<uint32_t>() : 0);
+        int32_t size = buffer_size(in);
         // Once an input has generated kOutputBudget bytes, its further buffers hold 512 bytes
         // at most: the events still run every check and state change, without megabytes of
         // per-sample work that the earlier events already covered.
@@ -200,14 +206,15 @@ class Session {
         stroke_ = Stroke::kUnknown;
         int32_t err = 0;
         const int32_t count = kova_get_src_num(ctx_);
-        switch (in.take<uint8_t>() % kAdminCount) {
-            case kAdminSelect: {
+        const uint8_t op = in.take<uint8_t>() % kAdminCount;
+        switch (op) {
+            case kSelect: {
                 const int32_t id = in.take<int8_t>();
                 const int32_t rc = kova_set_active_src(ctx_, id);
                 FUZZ_CHECK(rc == ((id >= 1 && id <= count) ? KOVA_OK : KOVA_ERR_INVALID_PARAM));
                 break;
             }
-            case kAdminRegFilter: {
+            case kRegFilter: {
                 const KOVA_FLT_DSC d = read_filter(in, format_);
                 // A kept set costs nothing; only a registration by the library counts.
                 const int32_t id = register_kept(ctx_, noise_key(format_, d), [&] {
@@ -217,23 +224,16 @@ class Session {
                 FUZZ_CHECK(id == 0 ? kova_get_src_num(ctx_) == count : id == count + 1);
                 break;
             }
-            case kAdminAttach: {
+            case kAttach:
+            case kUpdate: {
                 const KOVA_FLT_DSC d = read_filter(in, format_);
                 if (!costly()) break;
-                pcm_files().sync();  // a file set reads its files again
-                kept_sets().edited();
-                kova_attach_filter(ctx_, count, &d, &err);
+                g_pcm_files.sync();  // a file set reads its files again
+                g_kept_sets.edited();
+                (op == kAttach ? kova_attach_filter : kova_update_filter)(ctx_, count, &d, &err);
                 break;
             }
-            case kAdminUpdate: {
-                const KOVA_FLT_DSC d = read_filter(in, format_);
-                if (!costly()) break;
-                pcm_files().sync();  // a file set reads its files again
-                kept_sets().edited();
-                kova_update_filter(ctx_, count, &d, &err);
-                break;
-            }
-            case kAdminRepeat: {
+            case kRepeat: {
                 KOVA_RPT_INFO info{};
                 for (auto& v : info.len_ms) v = in.take<int16_t>();
                 for (auto& v : info.rpt_start_ms) v = in.take<int16_t>();
@@ -241,7 +241,7 @@ class Session {
                 kova_set_rptinfo(ctx_, count, &info);
                 break;
             }
-            case kAdminResave: {
+            case kResave: {
                 static const ScratchFile saved("gen-saved");
                 if (!costly()) break;
                 saved.remove();
@@ -273,21 +273,20 @@ class Session {
     Stroke stroke_ = Stroke::kClosed;
 };
 
-bool register_files(Bytes& in, KOVA_CTX* ctx, const KOVA_FORMAT& f) {
-    const size_t start = in.take<uint16_t>();
-    const size_t loop = static_cast<size_t>(in.take<uint16_t>()) * 4;
-    const size_t end = in.take<uint16_t>();
+void register_files(Bytes& in, KOVA_CTX* ctx, const KOVA_FORMAT& f) {
+    // start, loop (in units of 4 bytes), end; a braced list reads them in this order
+    const size_t lengths[KOVA_SLOT_COUNT] = {in.take<uint16_t>(), in.take<uint16_t>() * size_t{4},
+                                             in.take<uint16_t>()};
     const uint8_t amplitude = in.take<uint8_t>();
-    const size_t lengths[KOVA_SLOT_COUNT] = {start, loop, end};
-    pcm_files().want(lengths, amplitude);
+    std::memcpy(g_pcm_files.wanted, lengths, sizeof lengths);
+    g_pcm_files.amplitude = amplitude;
     const std::string key = "files" + key_bytes(f) + key_bytes(lengths) + key_bytes(amplitude);
     const int32_t id = register_kept(ctx, key, [&] {
-        pcm_files().sync();
+        g_pcm_files.sync();
         int32_t err = 0;
-        return kova_reg_src_byfiles(ctx, pcm_files().paths(), &err);
+        return kova_reg_src_byfiles(ctx, g_pcm_files.paths, &err);
     });
-    FUZZ_CHECK((id == 1) == (loop > 0));
-    return id == 1;
+    FUZZ_CHECK((id == 1) == (lengths[KOVA_SLOT_LOOP] > 0));
 }
 
 }  // namespace
@@ -295,17 +294,11 @@ bool register_files(Bytes& in, KOVA_CTX* ctx, const KOVA_FORMAT& f) {
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     Bytes in(data, size);
     const uint8_t flags = in.take<uint8_t>();
-    KOVA_FORMAT f{};
-    f.sample_rate = kScriptRates[flags & kFmtRateMask];
-    f.channels = (flags & kFmtMono) ? 1 : 2;
-    f.p = (flags & kFmtPan) ? 1 : 0;
-    f.w = in.take<uint16_t>();
-    f.h = in.take<uint16_t>();
-    if (flags & kFmtRaw) {
-        f.sample_rate = in.take<uint32_t>();
-        f.channels = in.take<uint32_t>();
-        f.p = in.take<uint32_t>();
-    }
+    // Braced lists read their operands in order.
+    KOVA_FORMAT f{kRates[flags & kFmtRateMask], (flags & kFmtMono) ? 1u : 2u,
+                  (flags & kFmtPan) ? 1u : 0u, in.take<uint16_t>(), in.take<uint16_t>()};
+    if (flags & kFmtRaw)
+        f = {in.take<uint32_t>(), in.take<uint32_t>(), in.take<uint32_t>(), f.w, f.h};
     const ReusedCtx engine(f);
     KOVA_CTX* ctx = engine.get();
     if (ctx == nullptr) {
@@ -315,15 +308,14 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     // The kept sets leave the context before it is reset (locals end in reverse order).
     struct Release {
         KOVA_CTX* ctx;
-        ~Release() { kept_sets().release(ctx); }
+        ~Release() { g_kept_sets.release(ctx); }
     } const release{ctx};
     int32_t err = 0;
 
-    // 0, 1, 2 as in event_script.h; any other value means files (a noise source costs about a
+    // 0, 1, 2 as above; any other value means files (a noise source costs about a
     // millisecond to make, so random kinds must not turn most inputs into filter inputs).
-    const uint8_t kind_byte = in.take<uint8_t>();
-    const uint8_t kind = kind_byte <= kSourceBoth ? kind_byte : uint8_t{kSourceFiles};
-    if (kind == kSourceFiles || kind == kSourceBoth) register_files(in, ctx, f);
+    const uint8_t kind = in.take<uint8_t>();
+    if (kind != kSourceFilter) register_files(in, ctx, f);
     bool made_noise = false;
     if (kind == kSourceFilter || kind == kSourceBoth) {
         const KOVA_FLT_DSC d = read_filter(in, f);

@@ -10,6 +10,7 @@
 // first bytes, in both copies, with the repeat span covering them; an empty file or a bad slot
 // fails with -4 and yields nothing; registration succeeds exactly when the loop file has bytes;
 // every generation result is a whole byte count within the buffer; nothing leaks.
+#include <algorithm>
 #include <cstdint>
 #include <cstring>
 #include <string>
@@ -31,16 +32,10 @@ constexpr int32_t kSlotLimit[KOVA_SLOT_COUNT] = {KOVA_SLOT_START_MAX_BYTES,
 constexpr uint8_t kBelowLimit = 0xFD, kAboveLimit = 0xFE, kWide = 0xFF;
 size_t file_length(uint8_t mode, uint16_t v, int32_t limit) {
     const auto lim = static_cast<size_t>(limit);
-    switch (mode) {
-        case kBelowLimit:
-            return lim - v % 64u;
-        case kAboveLimit:
-            return lim + v % 64u;
-        case kWide:
-            return (static_cast<size_t>(v) * 8u) % (2 * lim);
-        default:
-            return v % 1024u;
-    }
+    if (mode == kBelowLimit) return lim - v % 64u;
+    if (mode == kAboveLimit) return lim + v % 64u;
+    if (mode == kWide) return (static_cast<size_t>(v) * 8u) % (2 * lim);
+    return v % 1024u;
 }
 
 void check_load(const ScratchFile& file, const uint8_t* bytes, size_t size) {
@@ -52,7 +47,7 @@ void check_load(const ScratchFile& file, const uint8_t* bytes, size_t size) {
             continue;
         }
         FUZZ_CHECK(src != nullptr && err == KOVA_OK);
-        const size_t want = size < static_cast<size_t>(kSlotLimit[slot]) ? size : kSlotLimit[slot];
+        const size_t want = std::min<size_t>(size, kSlotLimit[slot]);
         FUZZ_CHECK(src->size == static_cast<int32_t>(want));
         FUZZ_CHECK(std::memcmp(src->pcm, bytes, want) == 0);
         FUZZ_CHECK(std::memcmp(src->pcm_proc, bytes, want) == 0);
@@ -66,7 +61,7 @@ void check_load(const ScratchFile& file, const uint8_t* bytes, size_t size) {
     for (int capacity : {0, 1, 100, 4097}) {
         std::string buf(static_cast<size_t>(capacity) + 8, '\x77');
         const int got = kova_read_source_file(file.path(), buf.data(), capacity);
-        const size_t want = size < static_cast<size_t>(capacity) ? size : capacity;
+        const size_t want = std::min<size_t>(size, capacity);
         FUZZ_CHECK(got == static_cast<int>(want));
         FUZZ_CHECK(want == 0 || std::memcmp(buf.data(), bytes, want) == 0);
         FUZZ_CHECK(buf.compare(capacity, 8, std::string(8, '\x77')) == 0);
@@ -86,7 +81,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     }
     // The rest of the input, repeated; a byte of 0 stands in for an empty rest.
     size_t pattern_len = 0;
-    const uint8_t* pattern = in.span(in.left(), &pattern_len);
+    const uint8_t* pattern = in.span(SIZE_MAX, &pattern_len);
     static const uint8_t kZero = 0;
     if (pattern_len == 0) {
         pattern = &kZero;
@@ -101,7 +96,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
         check_load(files[slot], c.data(), c.size());
     }
 
-    const ReusedCtx engine(phone_format());
+    const ReusedCtx engine(kPhoneFormat);
     KOVA_CTX* ctx = engine.get();
     FUZZ_CHECK(ctx != nullptr);
     int32_t err = 0;
@@ -116,14 +111,11 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
 
     // A start or end plays the whole sound as far as the buffer holds it.
     const int32_t buffers[] = {960000, 3840, 1, 2, 3};
+    const size_t start_bytes = std::min<size_t>(got[KOVA_SLOT_START], KOVA_SLOT_START_MAX_BYTES);
     for (int32_t bytes : buffers) {
-        KOVA_PARAM down{10.0f, 10.0f, 50, 0.0f, KOVA_ACTION_START};
+        const KOVA_PARAM down{10.0f, 10.0f, 50, 0.0f, KOVA_ACTION_START};
         const int32_t start = checked_gen(ctx, down, bytes);
-        const size_t held = got[KOVA_SLOT_START] < static_cast<size_t>(KOVA_SLOT_START_MAX_BYTES)
-                                ? got[KOVA_SLOT_START]
-                                : KOVA_SLOT_START_MAX_BYTES;
-        const int64_t start_bytes = static_cast<int64_t>(held / 2 * 2);
-        FUZZ_CHECK(start == (start_bytes < bytes / 2 * 2 ? start_bytes : bytes / 2 * 2));
+        FUZZ_CHECK(start == static_cast<int32_t>(std::min<size_t>(start_bytes, bytes) / 2 * 2));
     }
     short_stroke(ctx);
 

@@ -1,13 +1,17 @@
 // SPDX-License-Identifier: Apache-2.0
-// Registers a source set from an arbitrary source-set file (the input in the chunk language of
-// file_script.h), plays a short stroke with it, saves it and registers the saved file again;
-// then repeats the registration with an allocation failure injected somewhere along the way.
-// One engine context serves every input (reset in between).
+// An arbitrary source-set file (the input in the chunk language of file_script.h) through the four
+// engine-less queries, then registered as a source set, played with a short stroke, saved and
+// registered again; then the filter query and the registration again with an allocation failure
+// injected somewhere along the way. One engine context serves every input (reset in between).
 //
-// Properties: no crash, leak or undefined behaviour; a registration either succeeds with
-// identifier 1 and error 0 or fails with a documented code and registers nothing; every
-// generation result is a whole byte count within the buffer; a saved set reads back to a set
-// that saves to the very same bytes.
+// Properties: no crash, leak or undefined behaviour; every query on an existing file answers 0
+// (or -2 when memory runs out); outputs of absent items stay as the caller set them; the tune set
+// equals the record decoded here from the raw bytes (the caller's bytes where the file ends),
+// with the gain adjustment applied; a registration either succeeds with identifier 1 and error 0
+// or fails with a documented code and registers nothing; repeat points lie within their sound;
+// every generation result is a whole byte count within the buffer; a saved set reads back to a
+// set that saves to the very same bytes.
+#include <algorithm>
 #include <cmath>
 #include <cstddef>
 #include <cstdint>
@@ -23,18 +27,97 @@ using namespace kova_fuzz;
 
 namespace {
 
-bool documented_failure(int32_t err) {
-    return err == KOVA_ERR_INVALID_PARAM || err == KOVA_ERR_INSUFF_MEM || err == KOVA_ERR_SOURCE;
+void check_tuneset(const char* path, const uint8_t* data, size_t size) {
+    KOVA_TUNE_SET tune;
+    std::memset(&tune, 0x5A, sizeof tune);
+    const KOVA_TUNE_SET before = tune;
+    FUZZ_CHECK(kova_get_tuneset_fromfile(path, &tune) == KOVA_OK);
+    if (size < 4) return;
+    int32_t n = 0;
+    std::memcpy(&n, data, sizeof n);  // the files are little-endian, as the fuzzing machine
+    const int64_t at = 4 + 40 * static_cast<int64_t>(n > 0 ? n : 0);
+    KOVA_TUNE_SET stored = before;
+    if (static_cast<uint64_t>(at) < size) {
+        const size_t held = std::min<size_t>(sizeof stored, size - static_cast<size_t>(at));
+        std::memcpy(&stored, data + at, held);
+    }
+    if (!(stored.file_gain > 0.0) && !std::isnan(stored.file_gain))
+        stored.file_gain = stored.wn_gain;
+    stored.wn_gain = 0.0;
+    FUZZ_CHECK(same_tune(tune, stored));
+}
+
+void check_pcminfo(const char* path, size_t size) {
+    // Two runs with different presets: an output the query wrote is the same in both, one it
+    // left alone still holds its preset.
+    constexpr int kPreset[2] = {-7, 0x7EADBEEF};
+    int out[2][6];
+    for (int run = 0; run < 2; ++run) {
+        for (int& v : out[run]) v = kPreset[run];
+        int* o = out[run];
+        const int rc = kova_get_pcminfo_fromfile(path, &o[0], &o[1], &o[2], &o[3], &o[4], &o[5]);
+        FUZZ_CHECK(rc == KOVA_OK);
+    }
+    for (int slot = 0; slot < KOVA_SLOT_COUNT; ++slot) {
+        const bool offset_written = out[0][2 * slot] == out[1][2 * slot];
+        const bool size_written = out[0][2 * slot + 1] == out[1][2 * slot + 1];
+        FUZZ_CHECK(offset_written == size_written);  // a slot's two outputs go together
+        if (!offset_written) {
+            FUZZ_CHECK(out[0][2 * slot] == kPreset[0] && out[1][2 * slot] == kPreset[1]);
+            continue;
+        }
+        // A payload starts after at least one byte of its record, within the file (a negative
+        // stored size may move the next record back, but never before the start).
+        const int offset = out[0][2 * slot];
+        FUZZ_CHECK(offset >= 1);
+        FUZZ_CHECK(static_cast<size_t>(offset) <= size);
+    }
+}
+
+void check_filters(const char* path) {
+    KOVA_FLT_DSC flt[KOVA_FLT_TYPE_COUNT];
+    std::memset(flt, 0, sizeof flt);
+    for (auto& d : flt) d.type = 99;  // marks an element the query did not write
+    const int rc = kova_get_filters_fromfile(path, flt);
+    FUZZ_CHECK(rc == KOVA_OK || rc == KOVA_ERR_INSUFF_MEM);
+    for (uint32_t i = 0; i < KOVA_FLT_TYPE_COUNT; ++i)
+        FUZZ_CHECK(flt[i].type == 99 || flt[i].type == i);
+}
+
+void check_rptinfo(const char* path) {
+    KOVA_RPT_INFO info;
+    std::memset(&info, 0, sizeof info);
+    FUZZ_CHECK(kova_get_rptinfo_fromfile(path, &info) == KOVA_OK);
+    FUZZ_CHECK(kova_get_rptinfo_fromfile(path, nullptr) == KOVA_ERR_INVALID_PARAM);
+}
+
+// A registration either gives identifier 1 and error 0 or fails with a documented code and
+// registers nothing. Returns whether it succeeded.
+bool registered(KOVA_CTX* ctx, const char* path) {
+    int32_t err = 0;
+    const int32_t id = kova_reg_src_bysavefile(ctx, path, &err);
+    if (id == 0) {
+        FUZZ_CHECK(err == KOVA_ERR_INVALID_PARAM || err == KOVA_ERR_INSUFF_MEM ||
+                   err == KOVA_ERR_SOURCE);
+        FUZZ_CHECK(kova_get_src_num(ctx) == 0);
+    } else {
+        FUZZ_CHECK(id == 1 && err == KOVA_OK && kova_get_src_num(ctx) == 1);
+    }
+    return id != 0;
 }
 
 void play_and_resave(KOVA_CTX* ctx, const ScratchFile& saved, const ScratchFile& resaved) {
     KOVA_TUNE_SET tune{};
     FUZZ_CHECK(kova_get_tuneset(ctx, 1, &tune) == KOVA_OK);
+    FUZZ_CHECK(tune.wn_gain == 0.0);  // sources read back are file sources: no noise level
     KOVA_FLT_DSC flt[KOVA_FLT_TYPE_COUNT] = {};
     kova_get_filters(ctx, 1, flt);
     KOVA_RPT_INFO rpt{};
-    kova_get_rptinfo(ctx, 1, &rpt);
-
+    FUZZ_CHECK(kova_get_rptinfo(ctx, 1, &rpt) == KOVA_OK);
+    for (int slot = 0; slot < KOVA_SLOT_COUNT; ++slot) {  // within the sound; -1 when absent
+        FUZZ_CHECK(-1 <= rpt.rpt_start_ms[slot] && rpt.rpt_start_ms[slot] <= rpt.len_ms[slot]);
+        FUZZ_CHECK(-1 <= rpt.rpt_end_ms[slot] && rpt.rpt_end_ms[slot] <= rpt.len_ms[slot]);
+    }
     FUZZ_CHECK(kova_set_active_src(ctx, 1) == KOVA_OK);
     short_stroke(ctx);
 
@@ -43,8 +126,7 @@ void play_and_resave(KOVA_CTX* ctx, const ScratchFile& saved, const ScratchFile&
     resaved.remove();
     FUZZ_CHECK(kova_save_source(ctx, 1, saved.path()) >= 0);
     int32_t err = 0;
-    const int32_t again = kova_reg_src_bysavefile(ctx, saved.path(), &err);
-    FUZZ_CHECK(again == 2 && err == KOVA_OK);
+    FUZZ_CHECK(kova_reg_src_bysavefile(ctx, saved.path(), &err) == 2 && err == KOVA_OK);
     FUZZ_CHECK(kova_save_source(ctx, 2, resaved.path()) >= 0);
 
     // Reading moves a file_gain of 0 or less (not NaN) to the stored wn_gain, which a saved set
@@ -56,7 +138,6 @@ void play_and_resave(KOVA_CTX* ctx, const ScratchFile& saved, const ScratchFile&
     FUZZ_CHECK(same_tune(tune2, expected));
 
     std::string first = saved.read();
-    const std::string second = resaved.read();
     int32_t filters = 0;
     FUZZ_CHECK(first.size() >= sizeof filters);
     std::memcpy(&filters, first.data(), sizeof filters);
@@ -65,7 +146,7 @@ void play_and_resave(KOVA_CTX* ctx, const ScratchFile& saved, const ScratchFile&
         4 + 40 * static_cast<size_t>(filters) + offsetof(KOVA_TUNE_SET, file_gain);
     FUZZ_CHECK(gain_at + sizeof(double) <= first.size());
     std::memcpy(&first[gain_at], &expected.file_gain, sizeof(double));
-    FUZZ_CHECK(first == second);
+    FUZZ_CHECK(first == resaved.read());
 }
 
 }  // namespace
@@ -76,37 +157,29 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     static const ScratchFile resaved("srcset-resaved");
     const std::vector<uint8_t> file = expand_file(data, size);
     input.rewrite(file.data(), file.size());
-
-    int32_t err = 0;
+    check_tuneset(input.path(), file.data(), file.size());
+    check_pcminfo(input.path(), file.size());
+    check_filters(input.path());
+    check_rptinfo(input.path());
     {
-        const ReusedCtx engine(phone_format());
-        KOVA_CTX* ctx = engine.get();
-        FUZZ_CHECK(ctx != nullptr);
-        const int32_t id = kova_reg_src_bysavefile(ctx, input.path(), &err);
-        if (id == 0) {
-            FUZZ_CHECK(documented_failure(err));
-            FUZZ_CHECK(kova_get_src_num(ctx) == 0);
-        } else {
-            FUZZ_CHECK(id == 1 && err == KOVA_OK && kova_get_src_num(ctx) == 1);
-            play_and_resave(ctx, saved, resaved);
-        }
+        const ReusedCtx engine(kPhoneFormat);
+        FUZZ_CHECK(engine.get() != nullptr);
+        if (registered(engine.get(), input.path())) play_and_resave(engine.get(), saved, resaved);
     }
-
     // The same file with the n-th allocation failing (n taken from the input): a failure is
-    // reported as such and leaves the context as it was.
+    // reported as such and leaves the context as it was. No memory to open the file is reported
+    // as an unusable argument by the filter query.
     if (size > 0) {
-        const ReusedCtx engine(phone_format());
-        KOVA_CTX* ctx = engine.get();
-        kova_mem_fail_after(static_cast<long>(data[size - 1] % 16));
-        const int32_t id = kova_reg_src_bysavefile(ctx, input.path(), &err);
+        KOVA_FLT_DSC flt[KOVA_FLT_TYPE_COUNT] = {};
+        kova_mem_fail_after(static_cast<long>(data[0] % 4));
+        const int rc = kova_get_filters_fromfile(input.path(), flt);
         kova_mem_fail_after(-1);
-        if (id == 0) {
-            FUZZ_CHECK(documented_failure(err));
-            FUZZ_CHECK(kova_get_src_num(ctx) == 0);
-        } else {
-            FUZZ_CHECK(id == 1 && err == KOVA_OK);
-            short_stroke(ctx);
-        }
+        FUZZ_CHECK(rc == KOVA_OK || rc == KOVA_ERR_INVALID_PARAM || rc == KOVA_ERR_INSUFF_MEM);
+        const ReusedCtx engine(kPhoneFormat);
+        kova_mem_fail_after(static_cast<long>(data[size - 1] % 16));
+        const bool ok = registered(engine.get(), input.path());
+        kova_mem_fail_after(-1);
+        if (ok) short_stroke(engine.get());
     }
     return 0;
 }

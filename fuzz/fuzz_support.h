@@ -24,15 +24,13 @@ namespace kova_fuzz {
 class Bytes {
    public:
     Bytes(const uint8_t* data, size_t size) : p_(data), left_(size) {}
-    size_t left() const { return left_; }
     bool empty() const { return left_ == 0; }
     template <typename T>
     T take() {
         T value{};
-        const size_t n = left_ < sizeof(T) ? left_ : sizeof(T);
-        std::memcpy(&value, p_, n);  // the fuzz input is an image in machine byte order
-        p_ += n;
-        left_ -= n;
+        size_t got = 0;
+        const uint8_t* at = span(sizeof(T), &got);
+        std::memcpy(&value, at, got);  // the fuzz input is an image in machine byte order
         return value;
     }
     // Up to `n` bytes as a view; advances past them.
@@ -55,7 +53,7 @@ class Bytes {
 class ScratchFile {
    public:
     explicit ScratchFile(const char* tag);
-    ~ScratchFile();
+    ~ScratchFile() { remove(); }
     ScratchFile(const ScratchFile&) = delete;
     ScratchFile& operator=(const ScratchFile&) = delete;
     void rewrite(const void* data, size_t size) const;
@@ -68,38 +66,13 @@ class ScratchFile {
     std::string path_;
 };
 
-// An output buffer of exactly `size` bytes (at most kMaxBytes) followed by guard bytes that must
-// stay untouched (poisoned for AddressSanitizer, checked by value otherwise). The buffers share one
-// arena, so only one may exist at a time.
-class GuardedPcm {
-   public:
-    static constexpr int32_t kMaxBytes = 1 << 20;
-    explicit GuardedPcm(int32_t size);
-    ~GuardedPcm();
-    GuardedPcm(const GuardedPcm&) = delete;
-    GuardedPcm& operator=(const GuardedPcm&) = delete;
-    KOVA_PCMBUF* buf() { return &buf_; }
-    bool guard_intact() const;
-
-   private:
-    static constexpr size_t kGuard = 32;
-    static constexpr uint8_t kGuardByte = 0xA5;
-    uint8_t* guard_;  // right after the last byte of the buffer
-    size_t guard_bytes_;
-    KOVA_PCMBUF buf_{};
-};
-
 // One generation call with every property an application relies on checked: the result is a
-// whole, non-negative byte count that fits the buffer, nothing beyond the buffer is written and
-// nothing is allocated. Returns the byte count.
+// whole, non-negative byte count that fits the buffer (of `buffer_bytes`, at most 1 MiB),
+// nothing beyond the buffer is written and nothing is allocated. Returns the byte count.
 int32_t checked_gen(KOVA_CTX* ctx, const KOVA_PARAM& ev, int32_t buffer_bytes);
 
-// A realistic stroke: down, `moves` moves `dt_ms` apart along a diagonal, up; each call checked.
-// Returns the total bytes produced.
-int64_t checked_stroke(KOVA_CTX* ctx, int moves, int dt_ms, int32_t buffer_bytes);
-
 // The usual engine format: 48000 Hz stereo with position panning on a 1080 x 2280 screen.
-KOVA_FORMAT phone_format();
+constexpr KOVA_FORMAT kPhoneFormat{48000, 2, 1, 1080, 2280};
 
 // One engine context kept across inputs: creating one per input costs more than most inputs.
 // A ReusedCtx hands it out exactly as kova_init left it (a different format replaces it), and on
@@ -121,15 +94,9 @@ class ReusedCtx {
 };
 
 // A short stroke for the targets whose subject is a file, not generation (which the generation
-// target covers): down, two moves 4 ms apart, up, with buffers of `buffer_bytes`. Enough to
-// show that a set read from the file plays within its bounds.
-int64_t short_stroke(KOVA_CTX* ctx, int32_t buffer_bytes = 256);
-
-// Bitwise equality of two records (so NaN payloads compare equal to themselves).
-template <typename T>
-bool same_bytes(const T& a, const T& b) {
-    return std::memcmp(&a, &b, sizeof(T)) == 0;
-}
+// target covers): down, two moves 4 ms apart, up, with 256-byte buffers, each call checked.
+// Enough to show that a set read from the file plays within its bounds.
+void short_stroke(KOVA_CTX* ctx);
 
 // Field-by-field bitwise equality of two tune sets; padding bytes (which a record read from a
 // file may carry anything in) do not count.

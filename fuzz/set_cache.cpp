@@ -144,7 +144,7 @@ void SetCache::restore(Entry& e) {
     bool filters_same = filters->count == e.filters.size();
     NODE* n = filters->head->next;
     for (size_t i = 0; filters_same && i < e.filters.size(); ++i, n = n->next)
-        filters_same = same_bytes(*static_cast<const KOVA_FLT_DSC*>(n->data), e.filters[i]);
+        filters_same = std::memcmp(n->data, &e.filters[i], sizeof e.filters[i]) == 0;
     if (!filters_same) {
         while (filters->count > 0) list_removeat(filters, 0, kova_mem_free);
         for (const KOVA_FLT_DSC& d : e.filters) {

@@ -7,8 +7,8 @@
 #   3. AddressSanitizer + UndefinedBehaviorSanitizer build + CTest, with leak detection and
 #      float-to-integer overflow checks (GCC leaves float-cast-overflow out of "undefined");
 #   4. ThreadSanitizer build of the threaded suites (output stream, registry, Java layer, soak);
-#   5. libFuzzer targets (clang): seed corpora made by the library, replay of seeds and saved
-#      regressions, then a bounded fuzzing run per target;
+#   5. libFuzzer targets (clang): replay of the seed corpora and saved regressions, then a bounded
+#      fuzzing run per target;
 #   6. AArch64 cross build, its tests under qemu-user, and the source-set file exchange between
 #      x86-64 and AArch64 (scripts/aarch64.sh);
 #   7. consumer: install into a temporary prefix, then find_package, pkg-config, the README's C
@@ -124,23 +124,17 @@ if ! skipped fuzz; then
         >/dev/null
     cmake --build "$dir" -j "$jobs" --target kova_fuzz_all >"$dir.build.log" 2>&1 ||
         { tail -n 60 "$dir.build.log"; exit 1; }
-    rm -rf "$dir/seeds"
-    "$dir/fuzz/kova_fuzz_seeds" "$dir/seeds"
     fuzz_seconds=${KOVA_FUZZ_SECONDS:-60}
-    # target:seed corpus:largest input to generate. File inputs are chunked (fuzz/file_script.h)
-    # and PCM inputs give lengths, so short inputs reach every slot limit.
-    for entry in srcset_file:srcset:16384 file_queries:srcset:16384 pcm_load:pcm:8192 \
-        generate:generate:2048; do
-        IFS=: read -r target seeds max_len <<<"$entry"
+    # target:largest input to generate. File inputs are chunked (fuzz/file_script.h) and PCM
+    # inputs give lengths, so short inputs reach every slot limit.
+    for entry in srcset_file:16384 pcm_load:8192 generate:2048; do
+        IFS=: read -r target max_len <<<"$entry"
         bin=$dir/fuzz/kova_fuzz_$target
         work=$dir/corpus/$target
         artifacts=$dir/artifacts/$target
         mkdir -p "$work" "$artifacts"
-        replay=("$dir/seeds/$seeds")
-        # One regressions folder per kind of input: both set-file targets read srcset_file.
-        input=$target
-        [ "$target" = file_queries ] && input=srcset_file
-        [ -d "fuzz/regressions/$input" ] && replay+=("fuzz/regressions/$input")
+        replay=("fuzz/corpus/$target")
+        [ -d "fuzz/regressions/$target" ] && replay+=("fuzz/regressions/$target")
         # Every seed and every saved crash input must pass, then the target is fuzzed.
         "$bin" -runs=0 -close_fd_mask=1 -rss_limit_mb=3072 "${replay[@]}" >"$dir/replay-$target.log" 2>&1 ||
             { grep -v '^kova' "$dir/replay-$target.log" | tail -n 60; exit 1; }

@@ -1,32 +1,31 @@
 // SPDX-License-Identifier: Apache-2.0
-/* A program that uses the installed library the way an application does: writes three raw PCM
- * sounds, registers them, and renders a touch-down and one 16 ms move. Prints the header version
- * so the caller can compare it with the package's. Exit status 0 only when the move rendered 16 ms
- * of audible stereo at 48000 Hz. Usage: stroke DIRECTORY (where the sound files are written). */
+// A program that uses the installed library the way an application does: writes three raw PCM
+// sounds, registers them, and renders a touch-down and one 16 ms move. Prints the header version
+// so the caller can compare it with the package's. Exit status 0 only when the move rendered 16 ms
+// of audible stereo at 48000 Hz. Usage: stroke DIRECTORY (where the sound files are written).
 #include <kova/kova.h>
 #include <stdio.h>
 #include <string.h>
 
+// A square wave of `period` samples, 8000 high and 8000 low.
 static int write_sound(const char* path, int bytes, int period) {
     FILE* f = fopen(path, "wb");
-    if (f == NULL) return -1;
-    for (int i = 0; i < bytes / 2; i++) {
-        int16_t v = (int16_t)((i / 2) % period < period / 2 ? 8000 : -8000);
+    for (int i = 0; f != NULL && i < bytes / 2; i++) {
+        int16_t v = (int16_t)(i % period < period / 2 ? 8000 : -8000);
         fwrite(&v, sizeof v, 1, f);
     }
-    return fclose(f);
+    return f == NULL ? -1 : fclose(f);
 }
 
 int main(int argc, char** argv) {
+    static const char* names[KOVA_SLOT_COUNT] = {"start.raw", "loop.raw", "end.raw"};
+    static const int sizes[KOVA_SLOT_COUNT] = {9600, 96000, 9600};
     char paths[KOVA_SLOT_COUNT][512];
-    const char* names[KOVA_SLOT_COUNT] = {"start.raw", "loop.raw", "end.raw"};
-    const int sizes[KOVA_SLOT_COUNT] = {9600, 96000, 9600};
-    const char* path_ptrs[KOVA_SLOT_COUNT];
+    const char* path_ptrs[KOVA_SLOT_COUNT] = {paths[0], paths[1], paths[2]};
     if (argc != 2) return 2;
     for (int s = 0; s < KOVA_SLOT_COUNT; s++) {
         snprintf(paths[s], sizeof paths[s], "%s/%s", argv[1], names[s]);
-        if (write_sound(paths[s], sizes[s], 100) != 0) return 1;
-        path_ptrs[s] = paths[s];
+        if (write_sound(paths[s], sizes[s], 200) != 0) return 1;
     }
     printf("version %s\n", KOVA_VERSION_STRING);
 
@@ -34,8 +33,8 @@ int main(int argc, char** argv) {
     int32_t err;
     KOVA_CTX* ctx = kova_init(&fmt, &err);
     if (ctx == NULL) return 1;
-    int32_t id = kova_reg_src_byfiles(ctx, path_ptrs, &err);
-    int ok = id == 1 && kova_set_active_src(ctx, id) == KOVA_OK;
+    int ok =
+        kova_reg_src_byfiles(ctx, path_ptrs, &err) == 1 && kova_set_active_src(ctx, 1) == KOVA_OK;
 
     static int16_t pcm[96000];
     KOVA_PCMBUF out = {pcm, sizeof pcm};

@@ -8,11 +8,10 @@
 // found there, whichever machine wrote it, and checks what the engine and the file queries make
 // of it, and compares the sound a fixed stroke produces from it with gen-*.pcm of other machines.
 // scripts/aarch64.sh runs this test natively, then under qemu-aarch64, then natively again, so
-// each machine reads the other's file.
-#include <dirent.h>
+// each machine reads the other's file, and compares the files of both machines byte for byte.
 #include <gtest/gtest.h>
-#include <stdlib.h>
 
+#include <algorithm>
 #include <cstdint>
 #include <cstring>
 #include <filesystem>
@@ -22,6 +21,7 @@
 #include <vector>
 
 #include "kova/kova.h"
+#include "support/temp_dir.h"
 
 namespace {
 
@@ -34,22 +34,6 @@ constexpr const char* kArch = "other";
 #endif
 
 using Bytes = std::vector<uint8_t>;
-
-// Little-endian encoder, independent of the host's byte order and struct layout.
-struct Image {
-    Bytes b;
-    void u32(uint32_t v) {
-        for (int i = 0; i < 4; ++i) b.push_back(static_cast<uint8_t>(v >> (8 * i)));
-    }
-    void i32(int32_t v) { u32(static_cast<uint32_t>(v)); }
-    void f64(double d) {
-        uint64_t v;
-        std::memcpy(&v, &d, 8);
-        for (int i = 0; i < 8; ++i) b.push_back(static_cast<uint8_t>(v >> (8 * i)));
-    }
-    void zeros(size_t n) { b.insert(b.end(), n, 0); }
-    void raw(const Bytes& data) { b.insert(b.end(), data.begin(), data.end()); }
-};
 
 const KOVA_FORMAT kFormat{48000, 2, 1, 1080, 2280};
 const KOVA_FLT_DSC kFilters[2] = {{KOVA_FLT_LOWPASS, 3000.0, 0.75, 1, 48000, 2},
@@ -69,44 +53,51 @@ Bytes pcm(int slot) {
     return out;
 }
 
+// Little-endian encoders, independent of the host's byte order and struct layout.
+void put(Bytes& b, uint64_t v, int bytes) {
+    for (int i = 0; i < bytes; ++i) b.push_back(i < 8 ? static_cast<uint8_t>(v >> (8 * i)) : 0);
+}
+void put_i32(Bytes& b, int32_t v) {
+    put(b, static_cast<uint32_t>(v), 4);
+}
+void put_f64(Bytes& b, double d) {
+    uint64_t v;
+    std::memcpy(&v, &d, 8);
+    put(b, v, 8);
+}
+
 // The file a set saved on any machine must be, byte for byte. Reference words and padding are
 // written as zeros; `origin` is 1 for sources loaded from PCM files, 2 once read from a file.
 Bytes expected_file(int32_t origin) {
-    Image im;
-    im.i32(2);
+    Bytes b;
+    put_i32(b, 2);
     for (const KOVA_FLT_DSC& d : kFilters) {
-        im.u32(d.type);
-        im.zeros(4);
-        im.f64(d.freq);
-        im.f64(d.bandwidth);
-        im.u32(d.enable);
-        im.i32(d.samplerate);
-        im.i32(d.channels);
-        im.zeros(4);
+        put(b, d.type, 8);  // and 4 bytes of padding
+        put_f64(b, d.freq);
+        put_f64(b, d.bandwidth);
+        for (int32_t v : {static_cast<int32_t>(d.enable), d.samplerate, d.channels}) put_i32(b, v);
+        put(b, 0, 4);
     }
     const KOVA_TUNE_SET& t = kTune;
-    im.f64(t.gain);
-    im.f64(t.pan);
-    im.i32(t.osc_enable);
-    im.zeros(4);
-    im.f64(t.osc_depth);
-    im.i32(t.sharp_enable);
-    im.zeros(4);
-    for (double v : {t.sharpness, t.wn_gain, t.file_gain, t.start_gain, t.loop_gain, t.end_gain}) {
-        im.f64(v);
-    }
-    for (int32_t v : {1, 1, 1, 48000, 2}) im.i32(v);
+    put_f64(b, t.gain);
+    put_f64(b, t.pan);
+    put(b, t.osc_enable, 8);  // and padding
+    put_f64(b, t.osc_depth);
+    put(b, t.sharp_enable, 8);
+    for (double v : {t.sharpness, t.wn_gain, t.file_gain, t.start_gain, t.loop_gain, t.end_gain})
+        put_f64(b, v);
+    for (int32_t v : {1, 1, 1, 48000, 2}) put_i32(b, v);
     for (int slot = 0; slot < 3; ++slot) {
-        im.zeros(24);
-        im.i32(kSizes[slot]);
-        im.i32(0);  // play position
-        im.i32(slot);
-        im.i32(origin);
-        im.i32(slot == KOVA_SLOT_LOOP ? kLoopRepeatMs[0] * 192 : 0);
-        im.i32(slot == KOVA_SLOT_LOOP ? kLoopRepeatMs[1] * 192 : kSizes[slot]);
-        im.raw(pcm(slot));
+        const bool loop = slot == KOVA_SLOT_LOOP;
+        put(b, 0, 24);
+        for (int32_t v :
+             {kSizes[slot], 0 /* play position */, slot, origin, loop ? kLoopRepeatMs[0] * 192 : 0,
+              loop ? kLoopRepeatMs[1] * 192 : kSizes[slot]})
+            put_i32(b, v);
+        const Bytes samples = pcm(slot);
+        b.insert(b.end(), samples.begin(), samples.end());
     }
-    return im.b;
+    return b;
 }
 
 Bytes read_file(const std::string& path) {
@@ -121,94 +112,67 @@ void write_file(const std::string& path, const void* data, size_t n) {
 
 // First differing offset, or -1.
 long first_difference(const Bytes& a, const Bytes& b) {
-    const size_t n = std::min(a.size(), b.size());
-    for (size_t i = 0; i < n; ++i) {
-        if (a[i] != b[i]) return static_cast<long>(i);
-    }
-    return a.size() == b.size() ? -1 : static_cast<long>(n);
+    const auto at = std::mismatch(a.begin(), a.end(), b.begin(), b.end()).first - a.begin();
+    return a.size() == b.size() && at == static_cast<long>(a.size()) ? -1 : at;
 }
 
 class CrossArch : public testing::Test {
    protected:
+    // Builds the set through the engine in a context of its own and saves it as this machine's
+    // file: PCM files, two filters, a tune set and loop repeat points.
     void SetUp() override {
         const char* env = std::getenv("KOVA_XARCH_DIR");
-        if (env != nullptr && *env != '\0') {
-            dir_ = env;
-            std::filesystem::create_directories(dir_);
-        } else {
-            char templ[] = "/tmp/kova_xarch_XXXXXX";
-            dir_ = mkdtemp(templ);
-            own_dir_ = true;
-        }
+        dir_ = env != nullptr && *env != '\0' ? env : own_dir_.path;
+        std::filesystem::create_directories(dir_);
         int32_t err = 0;
         ctx_ = kova_init(&kFormat, &err);
         ASSERT_NE(ctx_, nullptr);
-        save_own_file();
+        std::string paths[3];
+        const char* cpaths[3];
+        for (int slot = 0; slot < 3; ++slot) {
+            paths[slot] = own_dir_.file(".pcm-" + std::to_string(slot));
+            write_file(paths[slot], pcm(slot).data(), static_cast<size_t>(kSizes[slot]));
+            cpaths[slot] = paths[slot].c_str();
+        }
+        ASSERT_EQ(kova_reg_src_byfiles(ctx_, cpaths, &err), 1);
+        for (const KOVA_FLT_DSC& d : kFilters) EXPECT_EQ(kova_attach_filter(ctx_, 1, &d, &err), 1);
+        EXPECT_EQ(kova_set_tuneset(ctx_, 1, &kTune), KOVA_OK);
+        KOVA_RPT_INFO rpt{{0, 0, 0}, {-1, kLoopRepeatMs[0], -1}, {-1, kLoopRepeatMs[1], -1}};
+        EXPECT_EQ(kova_set_rptinfo(ctx_, 1, &rpt), KOVA_OK);
+        std::remove(own_file().c_str());  // saving does not truncate
+        EXPECT_EQ(kova_save_source(ctx_, 1, own_file().c_str()),
+                  static_cast<int32_t>(expected_file(KOVA_ORIGIN_FILE).size()));
+        ASSERT_EQ(kova_deinit(ctx_), KOVA_OK);
+        ctx_ = kova_init(&kFormat, &err);
+        ASSERT_NE(ctx_, nullptr);
+    }
+    void TearDown() override {
+        if (ctx_ != nullptr) kova_deinit(ctx_);
     }
 
     std::string own_file() const { return dir_ + "/srcset-" + kArch + ".kss"; }
 
-    // Builds the set through the engine in a context of its own and saves it as this machine's
-    // file: PCM files, two filters, a tune set and loop repeat points.
-    void save_own_file() {
-        int32_t err = 0;
-        KOVA_CTX* ctx = kova_init(&kFormat, &err);
-        ASSERT_NE(ctx, nullptr);
-        std::string paths[3];
-        const char* cpaths[3];
-        for (int slot = 0; slot < 3; ++slot) {
-            paths[slot] = dir_ + "/.pcm-" + kArch + "-" + std::to_string(slot);
-            const Bytes data = pcm(slot);
-            write_file(paths[slot], data.data(), data.size());
-            cpaths[slot] = paths[slot].c_str();
-        }
-        EXPECT_EQ(kova_reg_src_byfiles(ctx, cpaths, &err), 1);
-        for (const KOVA_FLT_DSC& d : kFilters) EXPECT_EQ(kova_attach_filter(ctx, 1, &d, &err), 1);
-        EXPECT_EQ(kova_set_tuneset(ctx, 1, &kTune), KOVA_OK);
-        KOVA_RPT_INFO rpt{{0, 0, 0}, {-1, kLoopRepeatMs[0], -1}, {-1, kLoopRepeatMs[1], -1}};
-        EXPECT_EQ(kova_set_rptinfo(ctx, 1, &rpt), KOVA_OK);
-        for (const std::string& p : paths) std::remove(p.c_str());
-        std::remove(own_file().c_str());  // saving does not truncate
-        saved_bytes_ = kova_save_source(ctx, 1, own_file().c_str());
-        kova_deinit(ctx);
-    }
-    void TearDown() override {
-        if (ctx_ != nullptr) kova_deinit(ctx_);
-        if (own_dir_) std::filesystem::remove_all(dir_);
-    }
-
-    std::vector<std::string> files(const char* prefix, const char* suffix) const {
+    // Files of the exchange directory named PREFIX*SUFFIX.
+    std::vector<std::string> files(const std::string& prefix, const std::string& suffix) const {
         std::vector<std::string> out;
         for (const auto& e : std::filesystem::directory_iterator(dir_)) {
             const std::string name = e.path().filename().string();
-            if (name.rfind(prefix, 0) == 0 && name.size() > std::strlen(suffix) &&
-                name.compare(name.size() - std::strlen(suffix), std::string::npos, suffix) == 0) {
-                out.push_back(e.path().string());
-            }
+            if (name.starts_with(prefix) && name.ends_with(suffix)) out.push_back(e.path());
         }
         return out;
     }
 
+    kova_test::TempDir own_dir_;
     std::string dir_;
-    bool own_dir_ = false;
     KOVA_CTX* ctx_ = nullptr;
-    int32_t saved_bytes_ = 0;
 };
 
-// Saving on this machine writes exactly the little-endian image.
-TEST_F(CrossArch, SavedFileIsTheLittleEndianImage) {
+// Every machine's file, this one's included, is the little-endian image and reads back the same:
+// file queries, the engine's repeat points, and a re-save.
+TEST_F(CrossArch, FilesFromEveryMachineAreTheImageAndReadTheSame) {
     const Bytes expected = expected_file(KOVA_ORIGIN_FILE);
-    EXPECT_EQ(saved_bytes_, static_cast<int32_t>(expected.size()));
-    const Bytes written = read_file(own_file());
-    EXPECT_EQ(written.size(), expected.size());
-    EXPECT_EQ(first_difference(written, expected), -1);
-}
-
-// Every machine's file reads back the same: engine view, queries, a re-save, and the sound.
-TEST_F(CrossArch, FilesFromEveryMachineReadTheSame) {
     const std::vector<std::string> sets = files("srcset-", ".kss");
     ASSERT_FALSE(sets.empty());
-    const Bytes expected = expected_file(KOVA_ORIGIN_FILE);
     for (const std::string& path : sets) {
         SCOPED_TRACE(path);
         EXPECT_EQ(first_difference(read_file(path), expected), -1);
@@ -217,50 +181,36 @@ TEST_F(CrossArch, FilesFromEveryMachineReadTheSame) {
         ASSERT_EQ(kova_get_pcminfo_fromfile(path.c_str(), &off[0], &size[0], &off[1], &size[1],
                                             &off[2], &size[2]),
                   KOVA_OK);
-        const int first = 4 + 40 * 2 + 88 + 20 + 48;
-        EXPECT_EQ(off[0], first);
-        EXPECT_EQ(off[1], first + kSizes[0] + 48);
-        EXPECT_EQ(off[2], first + kSizes[0] + 48 + kSizes[1] + 48);
-        for (int slot = 0; slot < 3; ++slot) EXPECT_EQ(size[slot], kSizes[slot]);
+        int at = 4 + 40 * 2 + 88 + 20;
+        for (int slot = 0; slot < 3; ++slot) {
+            at += 48;  // the source record
+            EXPECT_EQ(off[slot], at);
+            EXPECT_EQ(size[slot], kSizes[slot]);
+            at += kSizes[slot];
+        }
 
         int32_t err = 0;
         const int32_t id = kova_reg_src_bysavefile(ctx_, path.c_str(), &err);
         ASSERT_GE(id, 1) << err;
-        KOVA_TUNE_SET tune{};
-        ASSERT_EQ(kova_get_tuneset(ctx_, id, &tune), KOVA_OK);
-        EXPECT_EQ(std::memcmp(&tune.gain, &kTune.gain, 16), 0);
-        EXPECT_EQ(tune.osc_enable, 1);
-        EXPECT_EQ(tune.sharp_enable, 1);
-        EXPECT_EQ(tune.sharpness, kTune.sharpness);
-        EXPECT_EQ(tune.file_gain, kTune.file_gain);
-        EXPECT_EQ(tune.end_gain, kTune.end_gain);
-        KOVA_FLT_DSC flt[KOVA_FLT_TYPE_COUNT] = {};
-        kova_get_filters(ctx_, id, flt);
-        EXPECT_EQ(flt[KOVA_FLT_LOWPASS].freq, kFilters[0].freq);
-        EXPECT_EQ(flt[KOVA_FLT_BANDPASS].bandwidth, kFilters[1].bandwidth);
         KOVA_RPT_INFO rpt{};
         ASSERT_EQ(kova_get_rptinfo(ctx_, id, &rpt), KOVA_OK);
-        EXPECT_EQ(rpt.len_ms[0], 20);
-        EXPECT_EQ(rpt.len_ms[1], 100);
-        EXPECT_EQ(rpt.len_ms[2], 10);
-        EXPECT_EQ(rpt.rpt_start_ms[1], kLoopRepeatMs[0]);
-        EXPECT_EQ(rpt.rpt_end_ms[1], kLoopRepeatMs[1]);
+        const KOVA_RPT_INFO want{
+            {20, 100, 10}, {0, kLoopRepeatMs[0], 0}, {20, kLoopRepeatMs[1], 10}};
+        EXPECT_EQ(std::memcmp(&rpt, &want, sizeof rpt), 0);
 
         // Saved again here, it is the same file with every source now marked as read back.
-        const std::string again = dir_ + "/.resaved-" + kArch;
+        const std::string again = own_dir_.file("resaved");
         std::remove(again.c_str());
         ASSERT_GT(kova_save_source(ctx_, id, again.c_str()), 0);
         EXPECT_EQ(first_difference(read_file(again), expected_file(KOVA_ORIGIN_SAVEFILE)), -1);
-        std::remove(again.c_str());
     }
 }
 
 // A fixed stroke played from the file gives the same samples on every machine.
 TEST_F(CrossArch, SameStrokeSameSamples) {
     int32_t err = 0;
-    const int32_t id = kova_reg_src_bysavefile(ctx_, own_file().c_str(), &err);
-    ASSERT_EQ(id, 1) << err;
-    ASSERT_EQ(kova_set_active_src(ctx_, id), KOVA_OK);
+    ASSERT_EQ(kova_reg_src_bysavefile(ctx_, own_file().c_str(), &err), 1) << err;
+    ASSERT_EQ(kova_set_active_src(ctx_, 1), KOVA_OK);
     std::vector<int16_t> all;
     std::vector<int16_t> buf(96000);
     KOVA_PCMBUF out{buf.data(), static_cast<int32_t>(buf.size() * 2)};
@@ -277,10 +227,7 @@ TEST_F(CrossArch, SameStrokeSameSamples) {
     ASSERT_GT(all.size(), 20000u);
     // Stored as 16-bit little-endian, as the device plays it.
     Bytes le;
-    for (int16_t s : all) {
-        le.push_back(static_cast<uint8_t>(static_cast<uint16_t>(s) & 0xFF));
-        le.push_back(static_cast<uint8_t>(static_cast<uint16_t>(s) >> 8));
-    }
+    for (int16_t s : all) put(le, static_cast<uint16_t>(s), 2);
     write_file(dir_ + "/gen-" + kArch + ".pcm", le.data(), le.size());
     for (const std::string& other : files("gen-", ".pcm")) {
         SCOPED_TRACE(other);
