@@ -327,8 +327,8 @@ TEST(ApiContract, SignalFileStreamAndListCallsRefuseNullAndWrongTags) {
     kova_mem_free(busy);
 }
 
-/* Every Java method with an id that names no instance (0, negative, past the last slot, a free
- * slot), and with an instance that has lost its engine context. */
+// Every Java method with an id that names no instance (0, negative, past the last slot, a free
+// slot), and with an instance that has lost its engine context.
 class JavaContract : public jni_test::Loaded {};
 
 TEST_F(JavaContract, MethodsRefuseIdsWithoutInstanceOrContext) {

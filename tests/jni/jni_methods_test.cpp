@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
-/* The control, generation and volume-table methods through a fake JNI environment: results at the
- * edges, log lines, the pairing of JNI obtains and releases, the blocks handed to the output
- * stream and the table rows copied into Java arrays. */
+// The control, generation and volume-table methods through a fake JNI environment: results at the
+// edges, log lines, the pairing of JNI obtains and releases, the blocks handed to the output
+// stream and the table rows copied into Java arrays.
 #include "jni/jni_test_support.h"
 #include "kova/kova_output.h"
 #include "kova_host/audio_sink.h"
@@ -100,9 +100,9 @@ TEST_F(Methods, TuningThicknessAndVolumeReachTheEngine) {
                "kova_set_volume(1,0.500000)", "kova_set_volume(1) is failed. (err : -3)"}));
 }
 
-/* gen_sounds and gen_tofasttrack hand the engine the event as given: a reference context fed the
- * same events directly produces the same bytes. The ring buffer is read back with the device
- * held, so it holds exactly what was written. */
+// gen_sounds and gen_tofasttrack hand the engine the event as given: a reference context fed the
+// same events directly produces the same bytes. The ring buffer is read back with the device
+// held, so it holds exactly what was written.
 TEST_F(Methods, GeneratedBlocksMatchTheEngineAndReachTheStreamWhole) {
     ASSERT_EQ(reg(1, &start, &loop, &end), 1);
     ASSERT_EQ(init_default(), 2);
@@ -167,8 +167,8 @@ TEST(VolumeTables, ChecksumOfEveryTable) {
     EXPECT_EQ(h, 0x622fc9a253244b64ull);
 }
 
-/* Java arrays of any length get at most row one each, never more than they hold; every array
- * obtained is released; a missing array leaves the other alone. */
+// Java arrays of any length get at most row one each, never more than they hold; every array
+// obtained is released; a missing array leaves the other alone.
 TEST(VolumeTables, JavaArraysGetRowOneWithinTheirLength) {
     Array<jfloat> short_spk(5, -1), long_hs(20, -1), untouched(17, -1);
     counters().reset();

@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
-/* Helpers for the tests of the Java-facing layer: a minimal JNI environment for calling the native
- * methods without a JVM (Java strings and arrays are test-owned objects, and every obtain/release
- * is counted so a test can check the pairing), the Java entry points, PCM source files and the
- * registry's log lines. */
+// Helpers for the tests of the Java-facing layer: a minimal JNI environment for calling the native
+// methods without a JVM (Java strings and arrays are test-owned objects, and every obtain/release
+// is counted so a test can check the pairing), the Java entry points, PCM source files and the
+// registry's log lines.
 #ifndef KOVA_TESTS_JNI_TEST_SUPPORT_H
 #define KOVA_TESTS_JNI_TEST_SUPPORT_H
 
@@ -40,7 +40,7 @@ inline Counters& counters() {
     return c;
 }
 
-/* Java objects: the fake handles point at these. */
+// Java objects: the fake handles point at these.
 struct String {
     std::string utf;
 };
@@ -63,8 +63,8 @@ Array<T>* array_of(jarray a) {
     return static_cast<Array<T>*>(base_of(a));
 }
 
-/* Elements are handed out as a separate copy, as a VM may do, so only a release with mode 0
- * makes the native side's writes visible in the array. */
+// Elements are handed out as a separate copy, as a VM may do, so only a release with mode 0
+// makes the native side's writes visible in the array.
 template <typename T>
 T* get_elements(jarray a) {
     counters().arrays_got++;
@@ -122,7 +122,7 @@ inline jfloatArray jfloats(Array<jfloat>& a) {
     return reinterpret_cast<jfloatArray>(static_cast<ArrayBase*>(&a));
 }
 
-/* A VM whose GetEnv answers with a chosen code. */
+// A VM whose GetEnv answers with a chosen code.
 inline jint g_getenv_result = JNI_OK;
 inline JavaVM* vm() {
     static JNIInvokeInterface_ table = [] {
@@ -140,7 +140,7 @@ inline JavaVM* vm() {
 
 }  // namespace fake_jni
 
-/* The Java entry points, as the VM sees them. */
+// The Java entry points, as the VM sees them.
 extern "C" {
 jint JNI_OnLoad(JavaVM*, void*);
 void JNI_OnUnload(JavaVM*, void*);
@@ -174,7 +174,7 @@ inline jint deinit(jlong id) {
     return Java_com_corvane_audio_Kova_deinit(fake_jni::env(), nullptr, id);
 }
 
-/* Lines of the Java-facing layer; every one of them must be at info priority. */
+// Lines of the Java-facing layer; every one of them must be at info priority.
 inline std::vector<std::string> jni_lines(const kova_test::LogCapture& cap) {
     std::vector<std::string> out;
     for (const kova_test::LogLine& l : cap.lines()) {
@@ -185,7 +185,7 @@ inline std::vector<std::string> jni_lines(const kova_test::LogCapture& cap) {
     return out;
 }
 
-/* Frees every slot and destroys the registry lock, as at load time before the load hook ran. */
+// Frees every slot and destroys the registry lock, as at load time before the load hook ran.
 inline void reset_to_unloaded() {
     for (KovaInfo& slot : pKOVAInfo) {
         if (slot.isUsed == 1 && slot.pInstance) deinit(&slot - pKOVAInfo + 1);
@@ -202,7 +202,7 @@ inline void reset_to_unloaded() {
 using Lines = std::vector<std::string>;
 inline const std::string kPid = std::to_string(getpid());
 
-/* Tests that start from a freshly loaded library and leave it unloaded. */
+// Tests that start from a freshly loaded library and leave it unloaded.
 class Loaded : public ::testing::Test {
    protected:
     void SetUp() override {
@@ -216,21 +216,21 @@ class Loaded : public ::testing::Test {
     }
 };
 
-/* Takes the engine context away from the instance in `slot` (freeing it). */
+// Takes the engine context away from the instance in `slot` (freeing it).
 inline void drop_context(int slot) {
     KovaInstance* inst = pKOVAInfo[slot].pInstance;
     ASSERT_EQ(kova_deinit(inst->pCtx), 0);
     inst->pCtx = nullptr;
 }
 
-/* Frees a slot the teardowns cannot free (no context) together with its record. */
+// Frees a slot the teardowns cannot free (no context) together with its record.
 inline void discard(int slot) {
     KovaInstance* inst = pKOVAInfo[slot].pInstance;
     _KovaInfoDelbyKova(inst);
     kova_mem_free(inst);
 }
 
-/* Raw 16-bit stereo PCM: a quiet sine that stays far from clipping after every gain stage. */
+// Raw 16-bit stereo PCM: a quiet sine that stays far from clipping after every gain stage.
 class PcmFiles {
    public:
     std::string write(const std::string& name, size_t bytes, double hz) const {
