@@ -47,8 +47,8 @@ TEST_F(Methods, RegistrationAndSelection) {
     EXPECT_EQ(reg(1, &start, nullptr, &end), 0);
     EXPECT_EQ(reg(1, nullptr, &loop, nullptr), 1);
     EXPECT_EQ(reg(1, &start, &loop, &end), 2);
-    EXPECT_EQ(counters().strings_got, 6);
-    EXPECT_EQ(counters().strings_released, 6);
+    EXPECT_EQ(counters().got, 6);
+    EXPECT_EQ(counters().released, 6);
     EXPECT_EQ(Java_com_corvane_audio_Kova_get_1src_1num(env(), nullptr, 1), 2);
 
     EXPECT_EQ(set_src(1, 0), -3);  // equals the initial curSrc: no engine call
@@ -119,6 +119,7 @@ TEST_F(Methods, GeneratedBlocksMatchTheEngineAndReachTheStreamWhole) {
     kova_host_hold_device(1);
     Bytes out(960000);
     std::vector<jbyte> played;
+    counters().reset();
     jlong t = 1000;
     for (int i = 0; i < 12; ++i) {
         const int action = i == 0 ? 0 : i == 11 ? 2 : 1;
@@ -142,8 +143,8 @@ TEST_F(Methods, GeneratedBlocksMatchTheEngineAndReachTheStreamWhole) {
         t += 8 + i % 8;
     }
     EXPECT_GT(played.size(), 20000u);
-    EXPECT_EQ(counters().arrays_got, 12);
-    EXPECT_EQ(counters().arrays_released, 12);
+    EXPECT_EQ(counters().got, 12);
+    EXPECT_EQ(counters().released, 12);
     std::vector<jbyte> ring(kova_ringbuffer_read_space(ft->pRing));
     kova_ringbuffer_read(ft->pRing, ring.data(), static_cast<uint32_t>(ring.size()));
     EXPECT_EQ(ring, played);
@@ -178,8 +179,8 @@ TEST(VolumeTables, JavaArraysGetRowOneWithinTheirLength) {
     EXPECT_TRUE(std::equal(short_spk.items.begin(), short_spk.items.end(), &spkVolume[17]));
     EXPECT_TRUE(std::equal(&headsetVolume[17], &headsetVolume[34], long_hs.items.begin()));
     EXPECT_EQ(long_hs.items[17], -1);
-    EXPECT_EQ(counters().arrays_got, 2);
-    EXPECT_EQ(counters().arrays_released, 2);
+    EXPECT_EQ(counters().got, 2);
+    EXPECT_EQ(counters().released, 2);
     EXPECT_EQ(
         Java_com_corvane_audio_Kova_get_1volumeTable(env(), nullptr, jfloats(untouched), nullptr),
         0);

@@ -27,12 +27,11 @@
 
 namespace fake_jni {
 
+// Strings and arrays obtained and released.
 struct Counters {
-    std::atomic<int> strings_got{0};
-    std::atomic<int> strings_released{0};
-    std::atomic<int> arrays_got{0};
-    std::atomic<int> arrays_released{0};
-    void reset() { strings_got = strings_released = arrays_got = arrays_released = 0; }
+    std::atomic<int> got{0};
+    std::atomic<int> released{0};
+    void reset() { got = released = 0; }
 };
 
 inline Counters& counters() {
@@ -44,15 +43,13 @@ inline Counters& counters() {
 struct String {
     std::string utf;
 };
-struct ArrayBase {
-    virtual ~ArrayBase() = default;
-    virtual jsize length() const = 0;
+struct ArrayBase {  // what GetArrayLength reads without knowing the element type
+    jsize length;
 };
 template <typename T>
 struct Array : ArrayBase {
-    explicit Array(size_t n = 0, T fill = T{}) : items(n, fill) {}
+    explicit Array(size_t n = 0, T fill = T{}) : ArrayBase{jsize(n)}, items(n, fill) {}
     std::vector<T> items;
-    jsize length() const override { return static_cast<jsize>(items.size()); }
 };
 
 inline ArrayBase* base_of(jarray a) {
@@ -67,7 +64,7 @@ Array<T>* array_of(jarray a) {
 // makes the native side's writes visible in the array.
 template <typename T>
 T* get_elements(jarray a) {
-    counters().arrays_got++;
+    counters().got++;
     auto& items = array_of<T>(a)->items;
     T* copy = new T[items.size() + 1];
     std::copy(items.begin(), items.end(), copy);
@@ -76,7 +73,7 @@ T* get_elements(jarray a) {
 
 template <typename T>
 void release_elements(jarray a, T* elems, jint mode) {
-    counters().arrays_released++;
+    counters().released++;
     auto& items = array_of<T>(a)->items;
     if (mode == 0 || mode == JNI_COMMIT) std::copy(elems, elems + items.size(), items.begin());
     if (mode != JNI_COMMIT) delete[] elems;
@@ -86,14 +83,12 @@ inline JNIEnv* env() {
     static JNINativeInterface_ table = [] {
         JNINativeInterface_ t{};
         t.GetStringUTFChars = [](JNIEnv*, jstring s, jboolean* copy) -> const char* {
-            counters().strings_got++;
+            counters().got++;
             if (copy) *copy = JNI_FALSE;
             return reinterpret_cast<String*>(s)->utf.c_str();
         };
-        t.ReleaseStringUTFChars = [](JNIEnv*, jstring, const char*) {
-            counters().strings_released++;
-        };
-        t.GetArrayLength = [](JNIEnv*, jarray a) -> jsize { return base_of(a)->length(); };
+        t.ReleaseStringUTFChars = [](JNIEnv*, jstring, const char*) { counters().released++; };
+        t.GetArrayLength = [](JNIEnv*, jarray a) -> jsize { return base_of(a)->length; };
         t.GetByteArrayElements = [](JNIEnv*, jbyteArray a, jboolean*) {
             return get_elements<jbyte>(a);
         };
