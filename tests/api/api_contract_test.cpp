@@ -311,7 +311,7 @@ TEST_F(JavaContract, MethodsRefuseIdsWithoutInstanceOrContext) {
     String s{"/nonexistent"};
     Array<jbyte> out(64, 0x5a);
     kova_test::LogCapture cap;
-    counters().reset();
+    g_got = g_released = 0;
     // Checked inside: the rows' calls refer to this call's arguments.
     auto check_id = [&](jlong id, double reg) {
         JNIEnv* e = env();
@@ -336,16 +336,16 @@ TEST_F(JavaContract, MethodsRefuseIdsWithoutInstanceOrContext) {
         Java_com_corvane_audio_Kova_start_1fasttrack(env(), nullptr, id);
         Java_com_corvane_audio_Kova_stop_1fasttrack(env(), nullptr, id);
     }
-    EXPECT_EQ(counters().got, 4);  // gen_sounds's array only: no string for these ids
-    EXPECT_EQ(counters().released, 4);
+    EXPECT_EQ(g_got, 4);  // gen_sounds's array only: no string for these ids
+    EXPECT_EQ(g_released, 4);
     EXPECT_TRUE(cap.lines().empty());
     EXPECT_EQ(inst->pFastTrack->state, 0);  // id 1 untouched
 
     KOVA_CTX* ctx = inst->pCtx;
     inst->pCtx = nullptr;
     check_id(1, 0);
-    EXPECT_EQ(counters().got, 8);  // three strings and the array, all released
-    EXPECT_EQ(counters().released, 8);
+    EXPECT_EQ(g_got, 8);  // three strings and the array, all released
+    EXPECT_EQ(g_released, 8);
     EXPECT_EQ(inst->curSrc, 0);
     EXPECT_EQ(jni_test::jni_lines(cap),
               (jni_test::Lines{"kova_set_thickness() is failed. (ID is NULL)",

@@ -30,7 +30,7 @@ class Methods : public jni_test::Loaded {
         start = {files.write("start.pcm", 9600, 880)};
         loop = {files.write("loop.pcm", 192000, 220)};
         end = {files.write("end.pcm", 9600, 440)};
-        counters().reset();
+        g_got = g_released = 0;
         cap.clear();
     }
     void TearDown() override {
@@ -47,8 +47,8 @@ TEST_F(Methods, RegistrationAndSelection) {
     EXPECT_EQ(reg(1, &start, nullptr, &end), 0);
     EXPECT_EQ(reg(1, nullptr, &loop, nullptr), 1);
     EXPECT_EQ(reg(1, &start, &loop, &end), 2);
-    EXPECT_EQ(counters().got, 6);
-    EXPECT_EQ(counters().released, 6);
+    EXPECT_EQ(g_got, 6);
+    EXPECT_EQ(g_released, 6);
     EXPECT_EQ(Java_com_corvane_audio_Kova_get_1src_1num(env(), nullptr, 1), 2);
 
     EXPECT_EQ(set_src(1, 0), -3);  // equals the initial curSrc: no engine call
@@ -119,7 +119,7 @@ TEST_F(Methods, GeneratedBlocksMatchTheEngineAndReachTheStreamWhole) {
     kova_host_hold_device(1);
     Bytes out(960000);
     std::vector<jbyte> played;
-    counters().reset();
+    g_got = g_released = 0;
     jlong t = 1000;
     for (int i = 0; i < 12; ++i) {
         const int action = i == 0 ? 0 : i == 11 ? 2 : 1;
@@ -143,8 +143,8 @@ TEST_F(Methods, GeneratedBlocksMatchTheEngineAndReachTheStreamWhole) {
         t += 8 + i % 8;
     }
     EXPECT_GT(played.size(), 20000u);
-    EXPECT_EQ(counters().got, 12);
-    EXPECT_EQ(counters().released, 12);
+    EXPECT_EQ(g_got, 12);
+    EXPECT_EQ(g_released, 12);
     std::vector<jbyte> ring(kova_ringbuffer_read_space(ft->pRing));
     kova_ringbuffer_read(ft->pRing, ring.data(), static_cast<uint32_t>(ring.size()));
     EXPECT_EQ(ring, played);
@@ -172,15 +172,15 @@ TEST(VolumeTables, ChecksumOfEveryTable) {
 // obtained is released; a missing array leaves the other alone.
 TEST(VolumeTables, JavaArraysGetRowOneWithinTheirLength) {
     Array<jfloat> short_spk(5, -1), long_hs(20, -1), untouched(17, -1);
-    counters().reset();
+    g_got = g_released = 0;
     EXPECT_EQ(Java_com_corvane_audio_Kova_get_1volumeTable(env(), nullptr, jfloats(short_spk),
                                                            jfloats(long_hs)),
               0);
     EXPECT_TRUE(std::equal(short_spk.items.begin(), short_spk.items.end(), &spkVolume[17]));
     EXPECT_TRUE(std::equal(&headsetVolume[17], &headsetVolume[34], long_hs.items.begin()));
     EXPECT_EQ(long_hs.items[17], -1);
-    EXPECT_EQ(counters().got, 2);
-    EXPECT_EQ(counters().released, 2);
+    EXPECT_EQ(g_got, 2);
+    EXPECT_EQ(g_released, 2);
     EXPECT_EQ(
         Java_com_corvane_audio_Kova_get_1volumeTable(env(), nullptr, jfloats(untouched), nullptr),
         0);

@@ -28,16 +28,8 @@
 namespace fake_jni {
 
 // Strings and arrays obtained and released.
-struct Counters {
-    std::atomic<int> got{0};
-    std::atomic<int> released{0};
-    void reset() { got = released = 0; }
-};
-
-inline Counters& counters() {
-    static Counters c;
-    return c;
-}
+inline std::atomic<int> g_got{0};
+inline std::atomic<int> g_released{0};
 
 // Java objects: the fake handles point at these.
 struct String {
@@ -52,20 +44,17 @@ struct Array : ArrayBase {
     std::vector<T> items;
 };
 
-inline ArrayBase* base_of(jarray a) {
-    return reinterpret_cast<ArrayBase*>(a);
-}
 template <typename T>
-Array<T>* array_of(jarray a) {
-    return static_cast<Array<T>*>(base_of(a));
+std::vector<T>& items_of(jarray a) {
+    return static_cast<Array<T>*>(reinterpret_cast<ArrayBase*>(a))->items;
 }
 
 // Elements are handed out as a separate copy, as a VM may do, so only a release with mode 0
 // makes the native side's writes visible in the array.
 template <typename T>
 T* get_elements(jarray a) {
-    counters().got++;
-    auto& items = array_of<T>(a)->items;
+    g_got++;
+    auto& items = items_of<T>(a);
     T* copy = new T[items.size() + 1];
     std::copy(items.begin(), items.end(), copy);
     return copy;
@@ -73,8 +62,8 @@ T* get_elements(jarray a) {
 
 template <typename T>
 void release_elements(jarray a, T* elems, jint mode) {
-    counters().released++;
-    auto& items = array_of<T>(a)->items;
+    g_released++;
+    auto& items = items_of<T>(a);
     if (mode == 0 || mode == JNI_COMMIT) std::copy(elems, elems + items.size(), items.begin());
     if (mode != JNI_COMMIT) delete[] elems;
 }
@@ -83,12 +72,14 @@ inline JNIEnv* env() {
     static JNINativeInterface_ table = [] {
         JNINativeInterface_ t{};
         t.GetStringUTFChars = [](JNIEnv*, jstring s, jboolean* copy) -> const char* {
-            counters().got++;
+            g_got++;
             if (copy) *copy = JNI_FALSE;
             return reinterpret_cast<String*>(s)->utf.c_str();
         };
-        t.ReleaseStringUTFChars = [](JNIEnv*, jstring, const char*) { counters().released++; };
-        t.GetArrayLength = [](JNIEnv*, jarray a) -> jsize { return base_of(a)->length; };
+        t.ReleaseStringUTFChars = [](JNIEnv*, jstring, const char*) { g_released++; };
+        t.GetArrayLength = [](JNIEnv*, jarray a) -> jsize {
+            return reinterpret_cast<ArrayBase*>(a)->length;
+        };
         t.GetByteArrayElements = [](JNIEnv*, jbyteArray a, jboolean*) {
             return get_elements<jbyte>(a);
         };
