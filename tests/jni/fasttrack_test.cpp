@@ -19,6 +19,7 @@
 #include <vector>
 
 #include "kova/kova_output.h"
+#include "jni/jni_test_support.h"
 #include "kova_host/audio_sink.h"
 #include "support/log_capture.h"
 #include "util/kova_mem.h"
@@ -26,6 +27,7 @@
 namespace {
 
 using namespace std::chrono_literals;
+using jni_test::wait_for;
 using kova_test::LogLine;
 
 std::vector<uint8_t> pattern(size_t n, uint8_t first) {
@@ -191,17 +193,6 @@ TEST_F(FastTrack, CallbackHandsOverWhatIsStoredAndNeverPadsOrInvents) {
     buffer.raw = room.data();
     kova_stop_fasttrack(ft);
     EXPECT_EQ(pull(kMore, ft, 1024), 1024u);
-}
-
-// Waits (bounded, so a broken stream fails instead of hanging) until `done` holds.
-template <typename Pred>
-bool wait_for(Pred done) {
-    const auto give_up = std::chrono::steady_clock::now() + 30s;
-    while (!done()) {
-        if (std::chrono::steady_clock::now() > give_up) return false;
-        std::this_thread::sleep_for(2ms);
-    }
-    return true;
 }
 
 // A device that stopped draining: closing the stream returns after a short, bounded wait, the
