@@ -200,21 +200,6 @@ TEST(JniLoad, LoadHookCreatesLockAndRegistryOnceAndOnlyWithAnEnvironment) {
     reset_to_unloaded();
 }
 
-TEST_F(Registry, InitFillsTheFirstFreeSlotAndDeinitFreesIt) {
-    EXPECT_EQ(init_default(), 1);
-    EXPECT_EQ(init_default(), 2);
-    EXPECT_EQ(pKOVAInfo[0].pid, getpid());
-    EXPECT_EQ(pKOVAInfo[0].pInstance->pFastTrack->state, 0);  // left stopped
-    EXPECT_EQ(deinit(1), 0);
-    EXPECT_EQ(pKOVAInfo[0].isUsed, 0);
-    EXPECT_EQ(init_default(), 1);
-    EXPECT_EQ(jni_lines(cap),
-              (Lines{"kova_init()", "kova_init(id:1,48000hz,2ch,p:1,w:1080,h:2280)", "kova_init()",
-                     "kova_init(id:2,48000hz,2ch,p:1,w:1080,h:2280)", "kova_deinit()",
-                     "kova_deinit(id:1, pid:" + kPid + ")", "kova_init()",
-                     "kova_init(id:1,48000hz,2ch,p:1,w:1080,h:2280)"}));
-}
-
 TEST_F(Registry, DeinitOfBadIdsAndFreeSlotsKeepsTheLock) {
     ASSERT_EQ(init_default(), 1);
     pthread_mutex_t* lock = gpKovaMutex;
