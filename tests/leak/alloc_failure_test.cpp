@@ -112,6 +112,12 @@ auto failing_at(long n, F call) {
     return result;
 }
 
+// A device thread slow to end (on a loaded machine) frees its state only after the close: waits a
+// little for the live bytes to come back to `heap`.
+void settle(long long heap) {
+    for (int i = 0; i < 500 && g_live_bytes != heap; ++i) std::this_thread::sleep_for(1ms);
+}
+
 // Sweeps n = 0, 1, ... until a run never reached its n-th allocation; each run must give back
 // every byte.
 void sweep(const Op& op) {
@@ -133,8 +139,7 @@ void sweep(const Op& op) {
         const long long heap = g_live_bytes.load();
         const unsigned long before = kova_mem_alloc_count();
         run(n);
-        // A device thread slow to end (on a loaded machine) frees its state after the close.
-        for (int i = 0; i < 500 && g_live_bytes != heap; ++i) std::this_thread::sleep_for(1ms);
+        settle(heap);
         EXPECT_EQ(g_live_bytes.load(), heap) << "bytes not given back";
         if (kova_mem_alloc_count() - before <= static_cast<unsigned long>(n)) {
             EXPECT_GE(n, op.min_allocs);
@@ -421,6 +426,7 @@ TEST_F(AllocFailure, RepeatedLifecyclesGiveEverythingBack) {
     cycle();  // warm-up
     const long long heap = g_live_bytes.load();
     for (int i = 0; i < 30; ++i) cycle();
+    settle(heap);
     EXPECT_EQ(g_live_bytes.load(), heap);
 }
 
