@@ -16,6 +16,7 @@
 #include "jni/jni_test_support.h"
 #include "kova/kova.h"
 #include "kova/android/kova_fasttrack.h"
+#include "kova_host/audio_sink.h"
 #include "util/kova_mem.h"
 
 #if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
@@ -424,6 +425,7 @@ TEST_F(AllocFailure, RepeatedLifecyclesGiveEverythingBack) {
         EXPECT_EQ(Java_com_corvane_audio_Kova_deinit(env, nullptr, a), 0);
     };
     cycle();  // warm-up
+    EXPECT_TRUE(jni_test::wait_for([] { return kova_host_lingering_tracks() == 0; }));
     const long long heap = g_live_bytes.load();
     for (int i = 0; i < 30; ++i) cycle();
     settle(heap);
