@@ -1,42 +1,25 @@
 // SPDX-License-Identifier: Apache-2.0
-/* The control and generation methods through a fake JNI environment: results at the edges, log
- * lines, the pairing of JNI obtains and releases, and the blocks handed to the output stream. */
+// The control, generation and volume-table methods through a fake JNI environment: results at the
+// edges, log lines, the pairing of JNI obtains and releases, the blocks handed to the output
+// stream and the table rows copied into Java arrays.
 #include "jni/jni_test_support.h"
 #include "kova/kova_output.h"
 #include "kova_host/audio_sink.h"
 
 namespace {
 
-using fake_jni::counters;
-using fake_jni::env;
+using namespace fake_jni;
 using jni_test::init_default;
 using jni_test::jni_lines;
 using jni_test::Lines;
-using Bytes = fake_jni::Array<jbyte>;
+using Bytes = Array<jbyte>;
 
-jint reg(jlong id, fake_jni::String* s, fake_jni::String* l, fake_jni::String* e) {
-    auto js = [](fake_jni::String* p) { return p ? fake_jni::jstr(*p) : nullptr; };
+jint reg(jlong id, String* s, String* l, String* e) {
+    auto js = [](String* p) { return p ? jstr(*p) : nullptr; };
     return Java_com_corvane_audio_Kova_reg_1src_1byfiles(env(), nullptr, id, js(s), js(l), js(e));
 }
 jint set_src(jlong id, jint i) {
     return Java_com_corvane_audio_Kova_set_1src(env(), nullptr, id, i);
-}
-jint gen(jlong id, Bytes& out, float x, float y, jlong t, int action) {
-    return Java_com_corvane_audio_Kova_gen_1sounds(env(), nullptr, id, fake_jni::jbytes(out), x, y,
-                                                   t, 0.5f, action);
-}
-jint gen_ft(jlong id, float x, float y, jlong t, int action) {
-    return Java_com_corvane_audio_Kova_gen_1tofasttrack(env(), nullptr, id, x, y, t, 0.5f, action);
-}
-jint tune(jlong id, jint index, double gain) {
-    return Java_com_corvane_audio_Kova_set_1tuneset(env(), nullptr, id, index, gain, 0.3, 1, 0.5, 0,
-                                                    0.2, 0.0, 0.4, 0.6, 0.9, 0.6);
-}
-jint thick(jlong id, double v) {
-    return Java_com_corvane_audio_Kova_set_1thickness(env(), nullptr, id, v);
-}
-jint vol(jlong id, double v) {
-    return Java_com_corvane_audio_Kova_set_1volume(env(), nullptr, id, v);
 }
 
 class Methods : public jni_test::Loaded {
@@ -47,7 +30,7 @@ class Methods : public jni_test::Loaded {
         start = {files.write("start.pcm", 9600, 880)};
         loop = {files.write("loop.pcm", 192000, 220)};
         end = {files.write("end.pcm", 9600, 440)};
-        counters().reset();
+        g_got = g_released = 0;
         cap.clear();
     }
     void TearDown() override {
@@ -56,7 +39,7 @@ class Methods : public jni_test::Loaded {
     }
 
     jni_test::PcmFiles files;
-    fake_jni::String start, loop, end;
+    String start, loop, end;
     kova_test::LogCapture cap;
 };
 
@@ -64,8 +47,8 @@ TEST_F(Methods, RegistrationAndSelection) {
     EXPECT_EQ(reg(1, &start, nullptr, &end), 0);
     EXPECT_EQ(reg(1, nullptr, &loop, nullptr), 1);
     EXPECT_EQ(reg(1, &start, &loop, &end), 2);
-    EXPECT_EQ(counters().strings_got, 6);
-    EXPECT_EQ(counters().strings_released, 6);
+    EXPECT_EQ(g_got, 6);
+    EXPECT_EQ(g_released, 6);
     EXPECT_EQ(Java_com_corvane_audio_Kova_get_1src_1num(env(), nullptr, 1), 2);
 
     EXPECT_EQ(set_src(1, 0), -3);  // equals the initial curSrc: no engine call
@@ -73,7 +56,6 @@ TEST_F(Methods, RegistrationAndSelection) {
     EXPECT_EQ(pKOVAInfo[0].pInstance->pCtx->active_src, 1);
     EXPECT_EQ(set_src(1, 1), -3);
     EXPECT_EQ(set_src(1, 7), -3);  // refused by the engine, yet remembered
-    EXPECT_EQ(pKOVAInfo[0].pInstance->curSrc, 7);
     EXPECT_EQ(set_src(1, 7), -3);
     EXPECT_EQ(jni_lines(cap),
               (Lines{"kova_reg_src () is failed. error=-4", "kova_reg_src (1, idx:1)",
@@ -83,25 +65,30 @@ TEST_F(Methods, RegistrationAndSelection) {
 
 TEST_F(Methods, TuningThicknessAndVolumeReachTheEngine) {
     ASSERT_EQ(reg(1, &start, &loop, &end), 1);
-    ASSERT_EQ(set_src(1, 1), 0);
     cap.clear();
     KOVA_CTX* ctx = pKOVAInfo[0].pInstance->pCtx;
-    EXPECT_EQ(tune(1, 1, 0.75), 0);
+    auto tune = [](jint index, double gain) {
+        return Java_com_corvane_audio_Kova_set_1tuneset(env(), nullptr, 1, index, gain, 0.3, 1, 0.5,
+                                                        0, 0.2, 0.0, 0.4, 0.6, 0.9, 0.6);
+    };
+    auto thick = [](double v) {
+        return Java_com_corvane_audio_Kova_set_1thickness(env(), nullptr, 1, v);
+    };
+    auto vol = [](double v) {
+        return Java_com_corvane_audio_Kova_set_1volume(env(), nullptr, 1, v);
+    };
+    EXPECT_EQ(tune(1, 0.75), 0);
     KOVA_TUNE_SET t{};
     ASSERT_EQ(kova_get_tuneset(ctx, 1, &t), 0);
     EXPECT_EQ(t.gain, 0.75);
-    EXPECT_EQ(t.pan, 0.3);
-    EXPECT_EQ(t.osc_enable, 1);
-    EXPECT_EQ(t.osc_depth, 0.5);
-    EXPECT_EQ(t.wn_gain, 0.0);
     EXPECT_EQ(t.loop_gain, 0.9);
-    EXPECT_EQ(tune(1, 3, 0.5), -3);  // no such set: still logged
-    EXPECT_EQ(thick(1, 1.0), 0);
-    EXPECT_EQ(thick(1, 1.01), -3);
-    EXPECT_EQ(vol(1, 0.5), 0);
+    EXPECT_EQ(tune(3, 0.5), -3);  // no such set: still logged
+    EXPECT_EQ(thick(1.0), 0);
+    EXPECT_EQ(thick(1.01), -3);
+    EXPECT_EQ(vol(0.5), 0);
     EXPECT_DOUBLE_EQ(ctx->volume, 0.4);
     ctx->tag = 0;  // a context the engine refuses
-    EXPECT_EQ(vol(1, 0.5), -3);
+    EXPECT_EQ(vol(0.5), -3);
     ctx->tag = KOVA_CTX_TAG;
     EXPECT_EQ(
         jni_lines(cap),
@@ -113,9 +100,9 @@ TEST_F(Methods, TuningThicknessAndVolumeReachTheEngine) {
                "kova_set_volume(1,0.500000)", "kova_set_volume(1) is failed. (err : -3)"}));
 }
 
-/* gen_sounds and gen_tofasttrack hand the engine the event as given: a reference context fed the
- * same events directly produces the same bytes. The ring buffer is read back with the device
- * held, so it holds exactly what was written. */
+// gen_sounds and gen_tofasttrack hand the engine the event as given: a reference context fed the
+// same events directly produces the same bytes. The ring buffer is read back with the device
+// held, so it holds exactly what was written.
 TEST_F(Methods, GeneratedBlocksMatchTheEngineAndReachTheStreamWhole) {
     ASSERT_EQ(reg(1, &start, &loop, &end), 1);
     ASSERT_EQ(init_default(), 2);
@@ -123,31 +110,30 @@ TEST_F(Methods, GeneratedBlocksMatchTheEngineAndReachTheStreamWhole) {
     KOVA_FORMAT f{48000, 2, 1, 1080, 2280};
     int32_t err = 0;
     KOVA_CTX* ref = kova_init(&f, &err);
-    ASSERT_NE(ref, nullptr);
     const char* paths[3] = {start.utf.c_str(), loop.utf.c_str(), end.utf.c_str()};
     ASSERT_EQ(kova_reg_src_byfiles(ref, paths, &err), 1);
     std::vector<int16_t> ref_buf(480000);
     KOVA_PCMBUF ref_pcm{ref_buf.data(), 960000};
 
-    Bytes empty;
-    EXPECT_EQ(gen(1, empty, 10, 10, 0, 0), 0);
-    EXPECT_EQ(counters().arrays_got, counters().arrays_released);
-
     KOVA_FASTTRACK* ft = pKOVAInfo[1].pInstance->pFastTrack;
     kova_host_hold_device(1);
     Bytes out(960000);
     std::vector<jbyte> played;
+    g_got = g_released = 0;
     jlong t = 1000;
     for (int i = 0; i < 12; ++i) {
         const int action = i == 0 ? 0 : i == 11 ? 2 : 1;
         const float x = 100.0f + 9.0f * i, y = 200.0f + 4.0f * i;
         const KOVA_PARAM p{x, y, t, 0.5f, static_cast<uint32_t>(action)};
         const int32_t want = kova_gen_sounds(ref, &p, &ref_pcm);
-        ASSERT_EQ(gen(1, out, x, y, t, action), want) << i;
+        ASSERT_EQ(Java_com_corvane_audio_Kova_gen_1sounds(env(), nullptr, 1, jbytes(out), x, y, t,
+                                                          0.5f, action),
+                  want);
         ASSERT_TRUE(std::equal(out.items.begin(), out.items.begin() + want,
-                               reinterpret_cast<const jbyte*>(ref_buf.data())))
-            << i;
-        ASSERT_EQ(gen_ft(2, x, y, t, action), want) << i;
+                               reinterpret_cast<const jbyte*>(ref_buf.data())));
+        ASSERT_EQ(
+            Java_com_corvane_audio_Kova_gen_1tofasttrack(env(), nullptr, 2, x, y, t, 0.5f, action),
+            want);
         if (i == 0) {
             EXPECT_EQ(kova_ringbuffer_read_space(ft->pRing), 0u);  // stopped: nothing stored
             Java_com_corvane_audio_Kova_start_1fasttrack(env(), nullptr, 2);
@@ -157,13 +143,49 @@ TEST_F(Methods, GeneratedBlocksMatchTheEngineAndReachTheStreamWhole) {
         t += 8 + i % 8;
     }
     EXPECT_GT(played.size(), 20000u);
-    EXPECT_EQ(counters().arrays_got, counters().arrays_released);
+    EXPECT_EQ(g_got, 12);
+    EXPECT_EQ(g_released, 12);
     std::vector<jbyte> ring(kova_ringbuffer_read_space(ft->pRing));
     kova_ringbuffer_read(ft->pRing, ring.data(), static_cast<uint32_t>(ring.size()));
     EXPECT_EQ(ring, played);
     Java_com_corvane_audio_Kova_stop_1fasttrack(env(), nullptr, 2);
     EXPECT_EQ(ft->state, 0);
     kova_deinit(ref);
+}
+
+// FNV-1a over the bytes of all seven volume tables: any changed value changes it.
+TEST(VolumeTables, ChecksumOfEveryTable) {
+    uint64_t h = 0xcbf29ce484222325ull;
+    auto fnv1a = [&h](const float* v, size_t n) {
+        const auto* b = reinterpret_cast<const unsigned char*>(v);
+        for (size_t i = 0; i < n * sizeof(float); ++i) h = (h ^ b[i]) * 0x100000001b3ull;
+    };
+    for (const float* t :
+         {spkVolume, headsetVolume, earpieceVolume, bluetoothVolume, usbVolume, hdmiVolume}) {
+        fnv1a(t, KOVA_VOLUME_DEVICE_VALUES);
+    }
+    fnv1a(situationVolume, KOVA_VOLUME_SITUATION_VALUES);
+    EXPECT_EQ(h, 0x622fc9a253244b64ull);
+}
+
+// Java arrays of any length get at most row one each, never more than they hold; every array
+// obtained is released; a missing array leaves the other alone.
+TEST(VolumeTables, JavaArraysGetRowOneWithinTheirLength) {
+    Array<jfloat> short_spk(5, -1), long_hs(20, -1), untouched(17, -1);
+    g_got = g_released = 0;
+    EXPECT_EQ(Java_com_corvane_audio_Kova_get_1volumeTable(env(), nullptr, jfloats(short_spk),
+                                                           jfloats(long_hs)),
+              0);
+    EXPECT_TRUE(std::equal(short_spk.items.begin(), short_spk.items.end(), &spkVolume[17]));
+    EXPECT_TRUE(std::equal(&headsetVolume[17], &headsetVolume[34], long_hs.items.begin()));
+    EXPECT_EQ(long_hs.items[17], -1);
+    EXPECT_EQ(g_got, 2);
+    EXPECT_EQ(g_released, 2);
+    EXPECT_EQ(
+        Java_com_corvane_audio_Kova_get_1volumeTable(env(), nullptr, jfloats(untouched), nullptr),
+        0);
+    EXPECT_EQ(untouched.items, std::vector<jfloat>(17, -1));
+    EXPECT_EQ(Java_com_corvane_audio_Kova_get_1volumeTableSize(env(), nullptr, 2), 17);
 }
 
 }  // namespace

@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
-/* Helpers for the tests of the Java-facing layer: a minimal JNI environment for calling the native
- * methods without a JVM (Java strings and arrays are test-owned objects, and every obtain/release
- * is counted so a test can check the pairing), the Java entry points, PCM source files and the
- * registry's log lines. */
+// Helpers for the tests of the Java-facing layer: a minimal JNI environment for calling the native
+// methods without a JVM (Java strings and arrays are test-owned objects, and every obtain/release
+// is counted so a test can check the pairing), the Java entry points, PCM source files and the
+// registry's log lines.
 #ifndef KOVA_TESTS_JNI_TEST_SUPPORT_H
 #define KOVA_TESTS_JNI_TEST_SUPPORT_H
 
@@ -13,10 +13,12 @@
 
 #include <algorithm>
 #include <atomic>
+#include <chrono>
 #include <cmath>
 #include <filesystem>
 #include <fstream>
 #include <string>
+#include <thread>
 #include <vector>
 
 #include "kova/kova_engine.h"
@@ -27,48 +29,34 @@
 
 namespace fake_jni {
 
-struct Counters {
-    std::atomic<int> strings_got{0};
-    std::atomic<int> strings_released{0};
-    std::atomic<int> arrays_got{0};
-    std::atomic<int> arrays_released{0};
-    void reset() { strings_got = strings_released = arrays_got = arrays_released = 0; }
-};
+// Strings and arrays obtained and released.
+inline std::atomic<int> g_got{0};
+inline std::atomic<int> g_released{0};
 
-inline Counters& counters() {
-    static Counters c;
-    return c;
-}
-
-/* Java objects: the fake handles point at these. */
+// Java objects: the fake handles point at these.
 struct String {
     std::string utf;
 };
-struct ArrayBase {
-    virtual ~ArrayBase() = default;
-    virtual jsize length() const = 0;
+struct ArrayBase {  // what GetArrayLength reads without knowing the element type
+    jsize length;
 };
 template <typename T>
 struct Array : ArrayBase {
-    explicit Array(size_t n = 0, T fill = T{}) : items(n, fill) {}
+    explicit Array(size_t n = 0, T fill = T{}) : ArrayBase{jsize(n)}, items(n, fill) {}
     std::vector<T> items;
-    jsize length() const override { return static_cast<jsize>(items.size()); }
 };
 
-inline ArrayBase* base_of(jarray a) {
-    return reinterpret_cast<ArrayBase*>(a);
-}
 template <typename T>
-Array<T>* array_of(jarray a) {
-    return static_cast<Array<T>*>(base_of(a));
+std::vector<T>& items_of(jarray a) {
+    return static_cast<Array<T>*>(reinterpret_cast<ArrayBase*>(a))->items;
 }
 
-/* Elements are handed out as a separate copy, as a VM may do, so only a release with mode 0
- * makes the native side's writes visible in the array. */
+// Elements are handed out as a separate copy, as a VM may do, so only a release with mode 0
+// makes the native side's writes visible in the array.
 template <typename T>
 T* get_elements(jarray a) {
-    counters().arrays_got++;
-    auto& items = array_of<T>(a)->items;
+    g_got++;
+    auto& items = items_of<T>(a);
     T* copy = new T[items.size() + 1];
     std::copy(items.begin(), items.end(), copy);
     return copy;
@@ -76,8 +64,8 @@ T* get_elements(jarray a) {
 
 template <typename T>
 void release_elements(jarray a, T* elems, jint mode) {
-    counters().arrays_released++;
-    auto& items = array_of<T>(a)->items;
+    g_released++;
+    auto& items = items_of<T>(a);
     if (mode == 0 || mode == JNI_COMMIT) std::copy(elems, elems + items.size(), items.begin());
     if (mode != JNI_COMMIT) delete[] elems;
 }
@@ -86,14 +74,14 @@ inline JNIEnv* env() {
     static JNINativeInterface_ table = [] {
         JNINativeInterface_ t{};
         t.GetStringUTFChars = [](JNIEnv*, jstring s, jboolean* copy) -> const char* {
-            counters().strings_got++;
+            g_got++;
             if (copy) *copy = JNI_FALSE;
             return reinterpret_cast<String*>(s)->utf.c_str();
         };
-        t.ReleaseStringUTFChars = [](JNIEnv*, jstring, const char*) {
-            counters().strings_released++;
+        t.ReleaseStringUTFChars = [](JNIEnv*, jstring, const char*) { g_released++; };
+        t.GetArrayLength = [](JNIEnv*, jarray a) -> jsize {
+            return reinterpret_cast<ArrayBase*>(a)->length;
         };
-        t.GetArrayLength = [](JNIEnv*, jarray a) -> jsize { return base_of(a)->length(); };
         t.GetByteArrayElements = [](JNIEnv*, jbyteArray a, jboolean*) {
             return get_elements<jbyte>(a);
         };
@@ -122,7 +110,7 @@ inline jfloatArray jfloats(Array<jfloat>& a) {
     return reinterpret_cast<jfloatArray>(static_cast<ArrayBase*>(&a));
 }
 
-/* A VM whose GetEnv answers with a chosen code. */
+// A VM whose GetEnv answers with a chosen code.
 inline jint g_getenv_result = JNI_OK;
 inline JavaVM* vm() {
     static JNIInvokeInterface_ table = [] {
@@ -140,7 +128,7 @@ inline JavaVM* vm() {
 
 }  // namespace fake_jni
 
-/* The Java entry points, as the VM sees them. */
+// The Java entry points, as the VM sees them.
 extern "C" {
 jint JNI_OnLoad(JavaVM*, void*);
 void JNI_OnUnload(JavaVM*, void*);
@@ -174,7 +162,7 @@ inline jint deinit(jlong id) {
     return Java_com_corvane_audio_Kova_deinit(fake_jni::env(), nullptr, id);
 }
 
-/* Lines of the Java-facing layer; every one of them must be at info priority. */
+// Lines of the Java-facing layer; every one of them must be at info priority.
 inline std::vector<std::string> jni_lines(const kova_test::LogCapture& cap) {
     std::vector<std::string> out;
     for (const kova_test::LogLine& l : cap.lines()) {
@@ -185,7 +173,7 @@ inline std::vector<std::string> jni_lines(const kova_test::LogCapture& cap) {
     return out;
 }
 
-/* Frees every slot and destroys the registry lock, as at load time before the load hook ran. */
+// Frees every slot and destroys the registry lock, as at load time before the load hook ran.
 inline void reset_to_unloaded() {
     for (KovaInfo& slot : pKOVAInfo) {
         if (slot.isUsed == 1 && slot.pInstance) deinit(&slot - pKOVAInfo + 1);
@@ -200,9 +188,20 @@ inline void reset_to_unloaded() {
 }
 
 using Lines = std::vector<std::string>;
+
+// Waits (bounded, so a broken stream fails instead of hanging) until `done` holds.
+template <typename Pred>
+bool wait_for(Pred done) {
+    const auto give_up = std::chrono::steady_clock::now() + std::chrono::seconds(30);
+    while (!done()) {
+        if (std::chrono::steady_clock::now() > give_up) return false;
+        std::this_thread::sleep_for(std::chrono::milliseconds(2));
+    }
+    return true;
+}
 inline const std::string kPid = std::to_string(getpid());
 
-/* Tests that start from a freshly loaded library and leave it unloaded. */
+// Tests that start from a freshly loaded library and leave it unloaded.
 class Loaded : public ::testing::Test {
    protected:
     void SetUp() override {
@@ -216,21 +215,21 @@ class Loaded : public ::testing::Test {
     }
 };
 
-/* Takes the engine context away from the instance in `slot` (freeing it). */
+// Takes the engine context away from the instance in `slot` (freeing it).
 inline void drop_context(int slot) {
     KovaInstance* inst = pKOVAInfo[slot].pInstance;
     ASSERT_EQ(kova_deinit(inst->pCtx), 0);
     inst->pCtx = nullptr;
 }
 
-/* Frees a slot the teardowns cannot free (no context) together with its record. */
+// Frees a slot the teardowns cannot free (no context) together with its record.
 inline void discard(int slot) {
     KovaInstance* inst = pKOVAInfo[slot].pInstance;
     _KovaInfoDelbyKova(inst);
     kova_mem_free(inst);
 }
 
-/* Raw 16-bit stereo PCM: a quiet sine that stays far from clipping after every gain stage. */
+// Raw 16-bit stereo PCM: a quiet sine that stays far from clipping after every gain stage.
 class PcmFiles {
    public:
     std::string write(const std::string& name, size_t bytes, double hz) const {

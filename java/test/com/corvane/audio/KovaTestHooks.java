@@ -3,11 +3,9 @@ package com.corvane.audio;
 
 import java.util.List;
 
-/**
- * Test access to the stand-in audio device and to the library's log lines (tag "kova_jni").
- * Loading this class loads the hook library first and then the Kova library, so the lines of the
- * library's load hook are captured; they are kept in {@link #LOAD_LINES}.
- */
+// Test access to the stand-in audio device and to the library's log lines (tag "kova_jni").
+// Loading this class loads the hook library first and then the Kova library, so the lines of the
+// library's load hook are captured; they are kept in LOAD_LINES.
 final class KovaTestHooks {
     static final List<String> LOAD_LINES;
 
@@ -24,7 +22,7 @@ final class KovaTestHooks {
 
     private KovaTestHooks() {}
 
-    /** Log lines written since the previous call. */
+    // Log lines written since the previous call.
     static List<String> logs() {
         return List.of(takeLogLines());
     }
@@ -34,8 +32,6 @@ final class KovaTestHooks {
     static native void useNullSink();
 
     static native void clearCapture();
-
-    static native long captureSize();
 
     static native byte[] capture();
 
