@@ -1,12 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "support/tool_run.h"
 
-#include <dirent.h>
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sndfile.h>
 #include <spawn.h>
-#include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -14,6 +12,7 @@
 #include <csignal>
 #include <ctime>
 #include <cstdlib>
+#include <filesystem>
 #include <fstream>
 #include <sstream>
 
@@ -95,32 +94,6 @@ RunResult run_kova(const std::vector<std::string>& args, const std::string& dir,
     return r;
 }
 
-TempDir::TempDir() {
-    const char* base = std::getenv("TMPDIR");
-    std::string tmpl = std::string(base && *base ? base : "/tmp") + "/kova-tool-test-XXXXXX";
-    std::vector<char> buf(tmpl.begin(), tmpl.end());
-    buf.push_back('\0');
-    if (mkdtemp(buf.data())) path_ = buf.data();
-    EXPECT_FALSE(path_.empty());
-}
-
-TempDir::~TempDir() {
-    for (const std::string& f : list()) unlink(file(f).c_str());
-    rmdir(path_.c_str());
-}
-
-std::vector<std::string> TempDir::list() const {
-    std::vector<std::string> names;
-    DIR* d = opendir(path_.c_str());
-    if (!d) return names;
-    while (dirent* e = readdir(d)) {
-        const std::string n = e->d_name;
-        if (n != "." && n != "..") names.push_back(n);
-    }
-    closedir(d);
-    return names;
-}
-
 std::string read_file(const std::string& path) {
     std::ifstream in(path, std::ios::binary);
     std::stringstream ss;
@@ -133,9 +106,12 @@ void write_file(const std::string& path, const std::string& bytes) {
     f << bytes;
 }
 
-int64_t file_size(const std::string& path) {
-    struct stat st {};
-    return stat(path.c_str(), &st) == 0 ? st.st_size : -1;
+size_t count_files(const std::string& dir) {
+    return static_cast<size_t>(std::distance(std::filesystem::directory_iterator(dir), {}));
+}
+
+bool has(const std::string& text, const std::string& part) {
+    return text.find(part) != std::string::npos;
 }
 
 int count_lines(const std::string& text) {
