@@ -44,36 +44,19 @@ TEST(KovaSaveInspect, JsonShowsWhatWasSaved) {
     const int first = kCount + 2 * kFilter + kTune + kInfo + kRecord;
     const int loop_at = first + kStartBytes + kRecord, end_at = loop_at + kLoopBytes + kRecord;
     EXPECT_EQ(std::filesystem::file_size(dir.file("set.kset")), end_at + kEndBytes);
-    const Json want = {
-        {"slots",
-         {{"start", {{"offset", first}, {"size", kStartBytes}, {"length_ms", 40}}},
-          {"loop",
-           {{"offset", loop_at},
-            {"size", kLoopBytes},
-            {"length_ms", 1000},
-            {"repeat_start_ms", 100},
-            {"repeat_end_ms", 900}}},
-          {"end", {{"offset", end_at}, {"size", kEndBytes}, {"repeat_end_ms", 120}}}}},
-        {"filters", Json::array({Json::object({{"type", "lowpass"}, {"freq", 6000}}),
-                                 {{"type", "bandpass"},
-                                  {"freq", 2000},
-                                  {"bandwidth", 1000},
-                                  {"enable", 1},
-                                  {"samplerate", 48000},
-                                  {"channels", 2}}})},
-        // Read back, a noise level lives in file_gain: the saved set plays its loop as loud.
-        {"tune",
-         {{"gain", 0.7},
-          {"pan", 0.3},
-          {"osc_enable", 1},
-          {"osc_depth", 0.5},
-          {"sharp_enable", 1},
-          {"sharpness", 0.25},
-          {"start_gain", 0.5},
-          {"loop_gain", 0.8},
-          {"end_gain", 0.7},
-          {"file_gain", 0.6},
-          {"wn_gain", 0.0}}}};
+    // Read back, a noise level lives in file_gain: the saved set plays its loop as loud.
+    Json want = Json::parse(R"({"slots": {
+        "start": {"size": 7680, "length_ms": 40},
+        "loop": {"size": 192000, "length_ms": 1000, "repeat_start_ms": 100, "repeat_end_ms": 900},
+        "end": {"size": 23040, "repeat_end_ms": 120}},
+      "filters": [{"type": "lowpass", "freq": 6000}, {"type": "bandpass", "freq": 2000,
+        "bandwidth": 1000, "enable": 1, "samplerate": 48000, "channels": 2}],
+      "tune": {"gain": 0.7, "pan": 0.3, "osc_enable": 1, "osc_depth": 0.5, "sharp_enable": 1,
+        "sharpness": 0.25, "start_gain": 0.5, "loop_gain": 0.8, "end_gain": 0.7,
+        "file_gain": 0.6, "wn_gain": 0.0}})");
+    want["slots"]["start"]["offset"] = first;
+    want["slots"]["loop"]["offset"] = loop_at;
+    want["slots"]["end"]["offset"] = end_at;
     const Json flat = want.flatten();
     for (const auto& [path, value] : flat.items()) {
         EXPECT_EQ(j.value(Json::json_pointer(path), Json()), value) << path;
