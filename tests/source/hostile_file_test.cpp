@@ -2,8 +2,6 @@
 // Hand-made hostile set files: every truncation, refused counts, bad fields. Random and mutated
 // files are the fuzzers' part (fuzz/fuzz_srcset_file.cpp, fuzz/fuzz_file_queries.cpp), and
 // their saved regressions replay under ctest.
-#include <fcntl.h>
-
 #include "source_fixture.h"
 
 namespace {
@@ -51,17 +49,12 @@ int probe(const std::string& path, const Bytes& bytes, KOVA_SRCSET** keep = null
     KOVA_FLT_DSC f[4];
     KOVA_TUNE_SET tn;
     KOVA_RPT_INFO r;
-    fflush(stdout);
-    const int saved = dup(1), null_fd = open("/dev/null", O_WRONLY);
-    dup2(null_fd, 1);
+    testing::internal::CaptureStdout();
     q[0] = kova_get_pcminfo_fromfile(path.c_str(), &o[0], &o[1], &o[2], &o[3], &o[4], &o[5]);
     q[1] = kova_get_filters_fromfile(path.c_str(), f);
     q[2] = kova_get_tuneset_fromfile(path.c_str(), &tn);
     q[3] = kova_get_rptinfo_fromfile(path.c_str(), &r);
-    fflush(stdout);
-    dup2(saved, 1);
-    close(saved);
-    close(null_fd);
+    testing::internal::GetCapturedStdout();
     for (int v : q) EXPECT_EQ(v, KOVA_OK);
     keep ? void(*keep = set) : kova_free_sourceset(set);
     return rc;

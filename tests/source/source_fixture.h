@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Helpers for the sound-source tests: scratch files, a heap probe, hand-built source sets.
+// Helpers for the sound-source tests: scratch files and hand-built source sets.
 #ifndef KOVA_TESTS_SOURCE_FIXTURE_H
 #define KOVA_TESTS_SOURCE_FIXTURE_H
 
@@ -16,19 +16,6 @@
 #include "kova/kova_source.h"
 #include "support/temp_dir.h"
 #include "util/kova_mem.h"
-
-// Exact heap counts exist only with the sanitizer allocator (glibc keeps freed chunks in caches
-// it reports as in use), so leak checks are live in the sanitizer build.
-#if defined(__SANITIZE_ADDRESS__)
-extern "C" size_t __sanitizer_get_current_allocated_bytes(void);
-inline size_t heap_in_use() {
-    return __sanitizer_get_current_allocated_bytes();
-}
-#else
-inline size_t heap_in_use() {
-    return 0;
-}
-#endif
 
 using Bytes = std::vector<uint8_t>;
 
