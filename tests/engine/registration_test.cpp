@@ -7,6 +7,7 @@
 
 #include <atomic>
 #include <chrono>
+#include <filesystem>
 #include <string>
 #include <thread>
 #include <vector>
@@ -150,7 +151,11 @@ TEST(Registration, IdentifiersLimitsAndSelection) {
     const char* paths[3] = {nullptr, loop.c_str(), nullptr};
     int32_t err = 0;
     EXPECT_EQ(kova_reg_src_byfiles(e.get(), paths, &err), 1);
-    ASSERT_GT(kova_save_source(e.get(), 1, saved.c_str()), 0);
+    // Saved: count, tune set and slot table, then the loop's record and samples, nothing for the
+    // empty slots; a folder that does not exist refuses (the path kinds above).
+    ASSERT_EQ(kova_save_source(e.get(), 1, saved.c_str()), 112 + 48 + 8000);
+    EXPECT_EQ(std::filesystem::file_size(saved), 112u + 48 + 8000);
+    EXPECT_EQ(kova_save_source(e.get(), 1, dir.file("no/such").c_str()), KOVA_ERR_SOURCE);
     for (int i = 2; i <= 20; ++i) ASSERT_EQ(kova_reg_src_byfilter(e.get(), &kLowpass, &err), i);
     EXPECT_EQ(e.get()->active_src, 20);
     const auto full = [&](int32_t id) { return id == 0 && err == KOVA_ERR_SRC_FULL; };
