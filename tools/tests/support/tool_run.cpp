@@ -43,6 +43,14 @@ int wait_child(pid_t pid, int64_t sigint_at, int64_t& exit_ms) {
     return status;
 }
 
+/* Pointers to the strings, null-terminated, as exec takes them. */
+std::vector<char*> c_strings(std::vector<std::string>& strings) {
+    std::vector<char*> p;
+    for (std::string& s : strings) p.push_back(s.data());
+    p.push_back(nullptr);
+    return p;
+}
+
 }  // namespace
 
 RunResult run_kova(const std::vector<std::string>& args, const std::string& dir,
@@ -51,9 +59,7 @@ RunResult run_kova(const std::vector<std::string>& args, const std::string& dir,
     const std::string err_path = dir + "/.stderr";
     std::vector<std::string> argv_store{KOVA_TOOL_BINARY};
     argv_store.insert(argv_store.end(), args.begin(), args.end());
-    std::vector<char*> argv;
-    for (std::string& a : argv_store) argv.push_back(a.data());
-    argv.push_back(nullptr);
+    const std::vector<char*> argv = c_strings(argv_store);
 
     posix_spawn_file_actions_t fa;
     posix_spawn_file_actions_init(&fa);
@@ -69,9 +75,7 @@ RunResult run_kova(const std::vector<std::string>& args, const std::string& dir,
     posix_spawn_file_actions_addchdir_np(&fa, dir.c_str());
     std::vector<std::string> env_store(env);
     for (char** e = environ; *e; ++e) env_store.emplace_back(*e);
-    std::vector<char*> envp;
-    for (std::string& e : env_store) envp.push_back(e.data());
-    envp.push_back(nullptr);
+    const std::vector<char*> envp = c_strings(env_store);
     pid_t pid = -1;
     RunResult r;
     const int64_t start = now_ms();
