@@ -160,15 +160,10 @@ TEST(HostileFile, QueriesStayInRangeOnBadValues) {
     EXPECT_EQ(r.len_ms[1], 0);
     // A record read in part still reports its payload position (right after what was read).
     write_file(b.path, Bytes(b.file.begin(), b.file.begin() + kRecord[0] + 30));
-    int p[6] = {-7, -7, -7, -7, -7, -7};
-    ASSERT_EQ(kova_get_pcminfo_fromfile(b.path.c_str(), &p[0], &p[1], &p[2], &p[3], &p[4], &p[5]),
-              0);
-    EXPECT_TRUE(p[0] == int(kRecord[0]) + 30 && p[1] == 1000 && p[2] == -7);
+    EXPECT_EQ(pcminfo(b.path), (std::vector<int>{int(kRecord[0]) + 30, 1000, -7, -7, -7, -7}));
     write_file(b.path, b.with(kRecord[0] + 24, "\xff\xff\xff\x7f"));
-    int o[6] = {-7, -7, -7, -7, -7, -7};
-    ASSERT_EQ(kova_get_pcminfo_fromfile(b.path.c_str(), &o[0], &o[1], &o[2], &o[3], &o[4], &o[5]),
-              0);
-    EXPECT_TRUE(o[0] == 240 && o[1] == INT32_MAX && o[2] == -7);  // no 32-bit offset past it
+    // No 32-bit offset lies past a payload of INT32_MAX bytes: the later slots stay unreported.
+    EXPECT_EQ(pcminfo(b.path), (std::vector<int>{240, INT32_MAX, -7, -7, -7, -7}));
 }
 
 }  // namespace

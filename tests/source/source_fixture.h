@@ -89,6 +89,14 @@ inline int save(KOVA_SRCSET* set, const std::string& path, int rate = 48000, int
     return sum;
 }
 
+// Offset and size of slots 0, 1 and 2 as the file query gives them; -7 where it wrote nothing.
+inline std::vector<int> pcminfo(const std::string& p, int want_rc = KOVA_OK) {
+    std::vector<int> o(6, -7);
+    EXPECT_EQ(kova_get_pcminfo_fromfile(p.c_str(), &o[0], &o[1], &o[2], &o[3], &o[4], &o[5]),
+              want_rc);
+    return o;
+}
+
 // Filter descriptors of a set as (type, freq) pairs, in list order.
 inline std::vector<std::pair<uint32_t, double>> filters_of(const KOVA_SRCSET* set) {
     std::vector<std::pair<uint32_t, double>> out;
