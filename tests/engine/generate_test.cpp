@@ -67,9 +67,11 @@ struct GenTest : testing::Test {
                                  nullptr);
     }
     KOVA_SRC* loop_src() { return set->src[KOVA_SLOT_LOOP]; }
-    // The worked move: start at (100,100)@1000, move to (130,140)@1016.
-    int32_t worked_move() {
+    // The worked move: start at (100,100)@1000, move to (130,140)@1016, with the loop moved to
+    // `from` in between when given.
+    int32_t worked_move(int32_t from = -1) {
         EXPECT_EQ(gen(ctx.get(), event(100, 100, 1000, KOVA_ACTION_START), buf), 0);
+        if (from >= 0) loop_src()->pos = from;
         return gen(ctx.get(), event(130, 140, 1016, KOVA_ACTION_MOVE), buf);
     }
     Ref worked_ref(bool slew) {
@@ -85,14 +87,21 @@ struct GenTest : testing::Test {
     }
 };
 
+// From the loop's start, and from 6 samples before its end 95996, where it wraps to 47998.
 TEST_F(GenTest, WorkedMoveMatchesReference) {
-    ASSERT_EQ(worked_move(), 3072);
-    EXPECT_EQ(ctx->prev_env, kWorkedEnv);
-    EXPECT_EQ(ctx->fast_count, 0);
-    int32_t end_pos = 0;
-    const auto want = reference(loop, worked_ref(true), 1536, &end_pos);
-    EXPECT_EQ(std::vector<int16_t>(buf.begin(), buf.begin() + 1536), want);
-    EXPECT_EQ(loop_src()->pos, end_pos);
+    for (int32_t from : {0, 95990}) {
+        kova_eq_init(ctx->eq, 880, 5000, 48000);  // the reference starts from a fresh equaliser
+        ASSERT_EQ(worked_move(from), 3072);
+        EXPECT_EQ(ctx->prev_env, kWorkedEnv);
+        EXPECT_EQ(ctx->fast_count, 0);
+        Ref r = worked_ref(true);
+        r.pos = from;
+        int32_t end_pos = 0;
+        EXPECT_EQ(std::vector<int16_t>(buf.begin(), buf.begin() + 1536),
+                  reference(loop, r, 1536, &end_pos));
+        EXPECT_EQ(loop_src()->pos, end_pos);
+    }
+    EXPECT_EQ(loop_src()->pos, 47998 + 1530);
 
     const KOVA_PARAM a = event(100, 100, 1000, 0), b = event(130, 140, 1016, 1);
     double energy = 0;
@@ -151,18 +160,6 @@ TEST_F(GenTest, PitchRaiseStagesNoMoreThanTheWorkBuffer) {
     kova_resample_s16_stereo(48000, 6956, &in, &out);
     ASSERT_EQ(bytes, out.size);
     EXPECT_TRUE(std::equal(buf.begin(), buf.begin() + bytes / 2, want.begin()));
-}
-
-TEST_F(GenTest, LoopWrapsAtRepeatEnd) {
-    ASSERT_EQ(gen(ctx.get(), event(100, 100, 1000, KOVA_ACTION_START), buf), 0);
-    loop_src()->pos = 95990;  // 6 samples before the loop end 95996
-    ASSERT_EQ(gen(ctx.get(), event(130, 140, 1016, KOVA_ACTION_MOVE), buf), 3072);
-    Ref r = worked_ref(true);
-    r.pos = 95990;
-    int32_t end_pos = 0;
-    EXPECT_EQ(std::vector<int16_t>(buf.begin(), buf.begin() + 1536),
-              reference(loop, r, 1536, &end_pos));
-    EXPECT_EQ(loop_src()->pos, 47998 + 1530);
 }
 
 TEST_F(GenTest, SixthFastMoveRestartsLoop) {
