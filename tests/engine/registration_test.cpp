@@ -63,31 +63,32 @@ TEST(Registration, NonRegularFilesAreRefusedWithoutBlocking) {
         const char* p = path.c_str();
         const char* as_loop[3] = {loop.c_str(), p, nullptr};
         const char* as_start[3] = {p, loop.c_str(), nullptr};
-        std::vector<int64_t> r;
         int32_t code = 1;
         int load_code = 1;
-        r.push_back(kova_reg_src_byfiles(e.get(), as_loop, &code));
-        r.push_back(code);
-        r.push_back(kova_reg_src_bysavefile(e.get(), p, &code));
-        r.push_back(code);
-        r.push_back(kova_update_src_byfiles(e.get(), 1, as_start, &code));
-        r.push_back(code);
-        KOVA_SRC* src = kova_load_sound_source(p, KOVA_SLOT_LOOP, &load_code);
-        r.push_back(src != nullptr);
-        kova_free_sourceobj(src);
-        r.push_back(load_code);
         char buf[64];
-        r.push_back(kova_read_source_file(p, buf, sizeof buf));
         int off[6] = {0};
         KOVA_FLT_DSC flt[KOVA_FLT_TYPE_COUNT] = {};
         KOVA_TUNE_SET tune{};
         KOVA_RPT_INFO info{};
+        KOVA_SRC* src = kova_load_sound_source(p, KOVA_SLOT_LOOP, &load_code);
+        const bool loaded = src != nullptr;
+        kova_free_sourceobj(src);
         testing::internal::CaptureStdout();
-        r.push_back(
-            kova_get_pcminfo_fromfile(p, &off[0], &off[1], &off[2], &off[3], &off[4], &off[5]));
-        r.push_back(kova_get_filters_fromfile(p, flt));
-        r.push_back(kova_get_tuneset_fromfile(p, &tune));
-        r.push_back(kova_get_rptinfo_fromfile(p, &info));
+        // A braced list evaluates in order, so each code is read right after its call.
+        std::vector<int64_t> r = {
+            kova_reg_src_byfiles(e.get(), as_loop, &code),
+            code,
+            kova_reg_src_bysavefile(e.get(), p, &code),
+            code,
+            kova_update_src_byfiles(e.get(), 1, as_start, &code),
+            code,
+            loaded,
+            load_code,
+            kova_read_source_file(p, buf, sizeof buf),
+            kova_get_pcminfo_fromfile(p, &off[0], &off[1], &off[2], &off[3], &off[4], &off[5]),
+            kova_get_filters_fromfile(p, flt),
+            kova_get_tuneset_fromfile(p, &tune),
+            kova_get_rptinfo_fromfile(p, &info)};
         testing::internal::GetCapturedStdout();
         if (path != missing) r.push_back(kova_save_source(e.get(), 1, p));
         return r;
