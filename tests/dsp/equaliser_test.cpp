@@ -31,8 +31,6 @@ double level_at(double thickness, double hz) {
 
 TEST(Equaliser, InitAndThicknessSetKnownValues) {
     KOVA_EQ eq = fresh();
-    EXPECT_EQ(eq.slew_decay, 0.88);
-
     struct Case {
         double t, low, high, slew;
     };
@@ -40,7 +38,6 @@ TEST(Equaliser, InitAndThicknessSetKnownValues) {
                    Case{2, 1.2, .6, 1.0}, Case{-1, .6, 1.2, .7}, Case{NAN, .6, 1.2, .7}}) {
         EXPECT_EQ(kova_eq_set_thickness(&eq, c.t), &eq);
         EXPECT_DOUBLE_EQ(eq.low_gain, c.low) << c.t;
-        EXPECT_EQ(eq.mid_gain, 1.0);
         EXPECT_DOUBLE_EQ(eq.high_gain, c.high) << c.t;
         EXPECT_DOUBLE_EQ(eq.slew_decay, c.slew) << c.t;
     }

@@ -88,11 +88,8 @@ TEST(Noise, SourcesPerSlot) {
         EXPECT_EQ(err, KOVA_OK);
         EXPECT_EQ(s->size, sizes[slot]);
         EXPECT_EQ(s->rpt_end, s->size);
-        EXPECT_EQ(s->slot, int32_t(slot));
         EXPECT_EQ(s->origin, KOVA_ORIGIN_NOISE);
-        EXPECT_EQ(s->path, nullptr);
         EXPECT_EQ(std::memcmp(s->pcm, s->pcm_proc, s->size), 0);
-        for (int i = 0; i < s->size / 2; ++i) ASSERT_LE(std::abs(s->pcm[i]), 3276);
         kova_free_sourceobj(s);
     }
 }

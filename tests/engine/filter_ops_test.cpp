@@ -74,7 +74,6 @@ TEST_F(FilterOps, AttachReplacesSameTypeAndAppendsNewOnes) {
     EXPECT_EQ(out[2].bandwidth, 200.0);
     EXPECT_EQ(0, memcmp(&out[1], &untouched, sizeof(untouched)));
     EXPECT_EQ(0, memcmp(&out[3], &untouched, sizeof(untouched)));
-    EXPECT_EQ(kova_get_filters(ctx, 2, out), 0);
 }
 
 TEST_F(FilterOps, UpdateRereadsFilesAndRefiltersEverySource) {

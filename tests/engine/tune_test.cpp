@@ -40,10 +40,6 @@ TEST(TuneTest, ThicknessAndVolume) {
     EXPECT_EQ(set->thickness, 1.0);
     EXPECT_EQ(ctx->eq->low_gain, 1.2);
     EXPECT_EQ(ctx->eq->slew_decay, 1.0);
-    for (double bad : {1.01, -0.01, double(NAN)}) {
-        EXPECT_EQ(kova_set_thickness(ctx.get(), bad), KOVA_ERR_INVALID_PARAM);
-    }
-    EXPECT_EQ(set->thickness, 1.0);
 
     EXPECT_EQ(kova_set_volume(ctx.get(), 0.5), KOVA_OK);
     EXPECT_EQ(ctx->volume, 0.4);

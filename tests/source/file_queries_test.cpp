@@ -5,13 +5,6 @@
 
 namespace {
 
-std::vector<int> pcminfo(const std::string& p, int want_rc = KOVA_OK) {
-    std::vector<int> o(6, -7);  // offset and size of slots 0, 1, 2
-    EXPECT_EQ(kova_get_pcminfo_fromfile(p.c_str(), &o[0], &o[1], &o[2], &o[3], &o[4], &o[5]),
-              want_rc);
-    return o;
-}
-
 std::string printed(const std::function<int()>& query, int want_rc) {
     fflush(stdout);
     testing::internal::CaptureStdout();

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Helpers for the sound-source tests: scratch files, a heap probe, hand-built source sets.
+// Helpers for the sound-source tests: scratch files and hand-built source sets.
 #ifndef KOVA_TESTS_SOURCE_FIXTURE_H
 #define KOVA_TESTS_SOURCE_FIXTURE_H
 
@@ -16,19 +16,6 @@
 #include "kova/kova_source.h"
 #include "support/temp_dir.h"
 #include "util/kova_mem.h"
-
-// Exact heap counts exist only with the sanitizer allocator (glibc keeps freed chunks in caches
-// it reports as in use), so leak checks are live in the sanitizer build.
-#if defined(__SANITIZE_ADDRESS__)
-extern "C" size_t __sanitizer_get_current_allocated_bytes(void);
-inline size_t heap_in_use() {
-    return __sanitizer_get_current_allocated_bytes();
-}
-#else
-inline size_t heap_in_use() {
-    return 0;
-}
-#endif
 
 using Bytes = std::vector<uint8_t>;
 
@@ -100,6 +87,14 @@ inline int save(KOVA_SRCSET* set, const std::string& path, int rate = 48000, int
     kova_mem_free(m.path);
     kova_free_sourceset(set);
     return sum;
+}
+
+// Offset and size of slots 0, 1 and 2 as the file query gives them; -7 where it wrote nothing.
+inline std::vector<int> pcminfo(const std::string& p, int want_rc = KOVA_OK) {
+    std::vector<int> o(6, -7);
+    EXPECT_EQ(kova_get_pcminfo_fromfile(p.c_str(), &o[0], &o[1], &o[2], &o[3], &o[4], &o[5]),
+              want_rc);
+    return o;
 }
 
 // Filter descriptors of a set as (type, freq) pairs, in list order.

@@ -21,24 +21,16 @@ KOVA_SRCSET* sample_set(const KOVA_TUNE_SET& t) {
                     make_src(0, kStart, 400, 1200), make_src(1, kLoop, 0, 4000));
 }
 
-TEST(SrcsetFile, WriterLaysRecordsOutAtFixedOffsets) {
+TEST(SrcsetFile, WriterStoresTheSamplesNotTheWorkingCopy) {
     TempDir t;
     const int sum = save(sample_set(tune(0.5, 0.4)), t.file("s"), 44100, 1);
     const Bytes f = read_file(t.file("s"));
     ASSERT_EQ(f.size(), 4 + 80 + 88 + 20 + 48 + 1200 + 48 + 4000u);
     EXPECT_EQ(sum, static_cast<int>(f.size()));
-    // {offset, value}: count, descriptors, tune set, info, records; padding and the reference
-    // words are zero.
-    const std::pair<size_t, int32_t> ints[] = {
-        {0, 2},       {4, 2},   {8, 0},     {32, 48000}, {40, 0},      {44, 0},
-        {100, 1},     {104, 0}, {120, 0},   {172, 1},    {176, 1},     {180, 0},
-        {184, 44100}, {188, 1}, {192, 0},   {200, 0},    {212, 0},     {216, 1200},
-        {220, 77},    {228, 1}, {232, 400}, {236, 1200}, {1464, 4000}, {1472, 1}};
-    for (const auto& [off, v] : ints) EXPECT_EQ(at<int32_t>(f, off), v) << off;
-    const std::pair<size_t, double> reals[] = {{12, 1000.0}, {52, 3000.0}, {84, 0.9},
-                                               {132, 0.5},   {140, 0.4},   {164, 0.6}};
-    for (const auto& [off, v] : reals) EXPECT_EQ(at<double>(f, off), v) << off;
-    // Payloads are the unfiltered samples, not the working copy.
+    // Every field's offset is pinned by the cross-machine test's byte image; here the tune set's
+    // place after two descriptors, and payloads that are the samples, not the working copy.
+    EXPECT_EQ(at<double>(f, 84), 0.9);
+    EXPECT_EQ(at<double>(f, 164), 0.6);
     EXPECT_EQ(Bytes(f.begin() + 240, f.begin() + 1440), kStart);
     EXPECT_EQ(Bytes(f.begin() + 1488, f.end()), kLoop);
     Read r(t.file("s"));

@@ -1,12 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "support/tool_run.h"
 
-#include <dirent.h>
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sndfile.h>
 #include <spawn.h>
-#include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -14,6 +12,7 @@
 #include <csignal>
 #include <ctime>
 #include <cstdlib>
+#include <filesystem>
 #include <fstream>
 #include <sstream>
 
@@ -44,6 +43,14 @@ int wait_child(pid_t pid, int64_t sigint_at, int64_t& exit_ms) {
     return status;
 }
 
+/* Pointers to the strings, null-terminated, as exec takes them. */
+std::vector<char*> c_strings(std::vector<std::string>& strings) {
+    std::vector<char*> p;
+    for (std::string& s : strings) p.push_back(s.data());
+    p.push_back(nullptr);
+    return p;
+}
+
 }  // namespace
 
 RunResult run_kova(const std::vector<std::string>& args, const std::string& dir,
@@ -52,9 +59,7 @@ RunResult run_kova(const std::vector<std::string>& args, const std::string& dir,
     const std::string err_path = dir + "/.stderr";
     std::vector<std::string> argv_store{KOVA_TOOL_BINARY};
     argv_store.insert(argv_store.end(), args.begin(), args.end());
-    std::vector<char*> argv;
-    for (std::string& a : argv_store) argv.push_back(a.data());
-    argv.push_back(nullptr);
+    const std::vector<char*> argv = c_strings(argv_store);
 
     posix_spawn_file_actions_t fa;
     posix_spawn_file_actions_init(&fa);
@@ -70,9 +75,7 @@ RunResult run_kova(const std::vector<std::string>& args, const std::string& dir,
     posix_spawn_file_actions_addchdir_np(&fa, dir.c_str());
     std::vector<std::string> env_store(env);
     for (char** e = environ; *e; ++e) env_store.emplace_back(*e);
-    std::vector<char*> envp;
-    for (std::string& e : env_store) envp.push_back(e.data());
-    envp.push_back(nullptr);
+    const std::vector<char*> envp = c_strings(env_store);
     pid_t pid = -1;
     RunResult r;
     const int64_t start = now_ms();
@@ -95,32 +98,6 @@ RunResult run_kova(const std::vector<std::string>& args, const std::string& dir,
     return r;
 }
 
-TempDir::TempDir() {
-    const char* base = std::getenv("TMPDIR");
-    std::string tmpl = std::string(base && *base ? base : "/tmp") + "/kova-tool-test-XXXXXX";
-    std::vector<char> buf(tmpl.begin(), tmpl.end());
-    buf.push_back('\0');
-    if (mkdtemp(buf.data())) path_ = buf.data();
-    EXPECT_FALSE(path_.empty());
-}
-
-TempDir::~TempDir() {
-    for (const std::string& f : list()) unlink(file(f).c_str());
-    rmdir(path_.c_str());
-}
-
-std::vector<std::string> TempDir::list() const {
-    std::vector<std::string> names;
-    DIR* d = opendir(path_.c_str());
-    if (!d) return names;
-    while (dirent* e = readdir(d)) {
-        const std::string n = e->d_name;
-        if (n != "." && n != "..") names.push_back(n);
-    }
-    closedir(d);
-    return names;
-}
-
 std::string read_file(const std::string& path) {
     std::ifstream in(path, std::ios::binary);
     std::stringstream ss;
@@ -133,9 +110,12 @@ void write_file(const std::string& path, const std::string& bytes) {
     f << bytes;
 }
 
-int64_t file_size(const std::string& path) {
-    struct stat st {};
-    return stat(path.c_str(), &st) == 0 ? st.st_size : -1;
+size_t count_files(const std::string& dir) {
+    return static_cast<size_t>(std::distance(std::filesystem::directory_iterator(dir), {}));
+}
+
+bool has(const std::string& text, const std::string& part) {
+    return text.find(part) != std::string::npos;
 }
 
 int count_lines(const std::string& text) {

@@ -1,11 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
-/* Running the kova binary from tests, and the files around it. */
+/* Running the kova binary from tests, and reading back what it wrote. */
 #ifndef KOVA_TOOL_TESTS_TOOL_RUN_H
 #define KOVA_TOOL_TESTS_TOOL_RUN_H
 
 #include <cstdint>
 #include <string>
 #include <vector>
+
+#include "support/temp_dir.h"
 
 namespace kova_test {
 
@@ -23,26 +25,13 @@ RunResult run_kova(const std::vector<std::string>& args, const std::string& dir,
                    int sigint_after_ms = 0, const std::vector<std::string>& env = {},
                    bool stderr_tty = false);
 
-/* A fresh folder under the system temporary folder, removed with its files. */
-class TempDir {
-   public:
-    TempDir();
-    ~TempDir();
-    TempDir(const TempDir&) = delete;
-    TempDir& operator=(const TempDir&) = delete;
-    const std::string& path() const { return path_; }
-    std::string file(const std::string& name) const { return path_ + "/" + name; }
-    std::vector<std::string> list() const;
-
-   private:
-    std::string path_;
-};
-
 std::string read_file(const std::string& path);
 void write_file(const std::string& path, const std::string& bytes);
-int64_t file_size(const std::string& path);
+/* Files in the folder, hidden ones included. */
+size_t count_files(const std::string& dir);
 /* Lines of `text` that are not empty. */
 int count_lines(const std::string& text);
+bool has(const std::string& text, const std::string& part);
 
 struct Wav {
     int rate = 0;
@@ -55,7 +44,7 @@ struct Wav {
 void write_tone(const std::string& path, int format, int rate, int channels, double seconds);
 /* Reads a WAV file with libsndfile; a file it cannot open fails the calling test. */
 Wav read_wav(const std::string& path);
-/* Root mean square of channel 0..channels-1 together, over frames [first, last). */
+/* Root mean square of all channels together over frames [first, last). */
 double rms(const Wav& w, size_t first, size_t last);
 /* Largest absolute sample over frames [first, last). */
 int peak(const Wav& w, size_t first, size_t last);
