@@ -50,10 +50,6 @@ JNIEXPORT void JNICALL Java_com_corvane_audio_KovaTestHooks_clearCapture(JNIEnv*
     kova_host_capture_clear();
 }
 
-JNIEXPORT jlong JNICALL Java_com_corvane_audio_KovaTestHooks_captureSize(JNIEnv*, jclass) {
-    return static_cast<jlong>(kova_host_capture_size());
-}
-
 JNIEXPORT jbyteArray JNICALL Java_com_corvane_audio_KovaTestHooks_capture(JNIEnv* env, jclass) {
     std::vector<jbyte> bytes(kova_host_capture_size());
     bytes.resize(kova_host_capture_copy(bytes.data(), bytes.size()));
