@@ -100,8 +100,7 @@ void expect_fill_matches(uint32_t channels, uint32_t waveform, const std::vector
             for (int64_t i = 0; i < n; ++i) {
                 const double want = kova_osc_get_sample(one);
                 ASSERT_EQ(std::memcmp(&got[i], &want, sizeof want), 0)
-                    << "channels " << channels << " waveform " << one->waveform << " freq " << f
-                    << " value " << i << ": " << got[i] << " vs " << want;
+                    << channels << " " << one->waveform << " " << f << " " << i;
             }
             ASSERT_TRUE(fill->phase == one->phase && fill->hold == one->hold);
         }

@@ -1,14 +1,12 @@
 // SPDX-License-Identifier: Apache-2.0
-// Hand-built engine contexts and source sets for the engine tests (header-only).
+// Engine contexts and source sets registered from files for the engine tests (header-only).
 #ifndef KOVA_TESTS_ENGINE_FIXTURE_H
 #define KOVA_TESTS_ENGINE_FIXTURE_H
 
-#include <stdlib.h>
+#include <gtest/gtest.h>
 
 #include <cstdint>
 #include <cstring>
-#include <filesystem>
-#include <fstream>
 #include <memory>
 #include <string>
 #include <vector>
@@ -17,7 +15,6 @@
 #include "kova/kova_list.h"
 #include "kova/kova_source.h"
 #include "support/temp_dir.h"
-#include "util/kova_mem.h"
 
 namespace kova_test {
 
@@ -33,50 +30,27 @@ inline CtxPtr make_ctx(uint32_t rate = 48000, uint32_t channels = 2, uint32_t p 
     return CtxPtr(kova_init(&f, &err));
 }
 
-// A source holding `samples` in both pcm and pcm_proc; rpt_end covers the whole source.
-inline KOVA_SRC* make_src(int slot, int origin, const std::vector<int16_t>& samples) {
-    auto* src = static_cast<KOVA_SRC*>(kova_mem_calloc(1, sizeof(KOVA_SRC)));
-    const size_t bytes = samples.size() * sizeof(int16_t);
-    src->pcm = static_cast<int16_t*>(kova_mem_malloc(bytes ? bytes : 1));
-    src->pcm_proc = static_cast<int16_t*>(kova_mem_malloc(bytes ? bytes : 1));
-    if (bytes) {
-        std::memcpy(src->pcm, samples.data(), bytes);
-        std::memcpy(src->pcm_proc, samples.data(), bytes);
-    }
-    src->size = static_cast<int32_t>(bytes);
-    src->slot = slot;
-    src->origin = origin;
-    src->rpt_start = 0;
-    src->rpt_end = src->size;
-    return src;
-}
-
-// The tune set a registration from files gives.
-inline KOVA_TUNE_SET file_tune() {
-    return KOVA_TUNE_SET{1.0, 0.4, 0, 1.0, 0, 0.2, 0.0, 0.4, 0.6, 0.9, 0.6};
-}
-
-// A set with the given sources (null for an empty slot), appended to the context's list and
-// made active. Returns the set; the context owns it from here on.
-inline KOVA_SRCSET* add_set(KOVA_CTX* ctx, KOVA_SRC* start, KOVA_SRC* loop, KOVA_SRC* end,
-                            const KOVA_TUNE_SET& tune = file_tune()) {
-    auto* set = static_cast<KOVA_SRCSET*>(kova_mem_calloc(1, sizeof(KOVA_SRCSET)));
-    set->src[KOVA_SLOT_START] = start;
-    set->src[KOVA_SLOT_LOOP] = loop;
-    set->src[KOVA_SLOT_END] = end;
-    set->filters = list_create();
-    set->tune = static_cast<KOVA_TUNE_SET*>(kova_mem_calloc(1, sizeof(KOVA_TUNE_SET)));
-    *set->tune = tune;
-    set->thickness = 0.6;
-    list_pushback(ctx->src_list, set);
-    ctx->active_src = static_cast<int32_t>(ctx->src_list->count);
-    return set;
-}
-
 // The registered set with a 1-based identifier the test knows to exist.
 inline KOVA_SRCSET* set_of(KOVA_CTX* ctx, int id) {
     return static_cast<KOVA_SRCSET*>(
         list_getat(ctx->src_list, static_cast<uint32_t>(id - 1))->data);
+}
+
+// Registers the start, loop and end sounds given (empty: none in that slot) from files in `dir`,
+// as an application does; returns the new set, which is active.
+inline KOVA_SRCSET* reg_files(KOVA_CTX* ctx, const TempDir& dir,
+                              const std::vector<std::vector<int16_t>>& sounds) {
+    std::string paths[KOVA_SLOT_COUNT];
+    const char* p[KOVA_SLOT_COUNT] = {};
+    for (int slot = 0; slot < KOVA_SLOT_COUNT; ++slot) {
+        if (sounds[slot].empty()) continue;
+        paths[slot] = dir.write("slot" + std::to_string(slot), sounds[slot]);
+        p[slot] = paths[slot].c_str();
+    }
+    int32_t err = 0;
+    const int32_t id = kova_reg_src_byfiles(ctx, p, &err);
+    EXPECT_GT(id, 0);
+    return set_of(ctx, id);
 }
 
 // The eleven tune values in record order, for whole-record comparisons.

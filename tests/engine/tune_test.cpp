@@ -12,9 +12,9 @@ namespace {
 using kova_test::tune_values;
 
 TEST(TuneTest, SetTakesOnlyValuesInRange) {
+    kova_test::TempDir dir;
     kova_test::CtxPtr ctx = kova_test::make_ctx();
-    auto* set = kova_test::add_set(ctx.get(), nullptr, kova_test::make_src(1, 1, {1, 2}), nullptr);
-    KOVA_TUNE_SET& t = *set->tune;
+    KOVA_TUNE_SET& t = *kova_test::reg_files(ctx.get(), dir, {{}, {1, 2}, {}})->tune;
 
     // gain out of range, pan taken; oscillator on with a bad depth: neither changes; sharpness
     // pair taken; NaN, negative and just-above-1 levels skipped; 0 and 1 taken.
@@ -35,7 +35,8 @@ TEST(TuneTest, ThicknessAndVolume) {
     EXPECT_EQ(kova_set_thickness(ctx.get(), 1.0), KOVA_OK);  // no set yet: no effect
     EXPECT_EQ(ctx->eq->low_gain, 1.0);
 
-    auto* set = kova_test::add_set(ctx.get(), nullptr, kova_test::make_src(1, 1, {1, 2}), nullptr);
+    kova_test::TempDir dir;
+    KOVA_SRCSET* set = kova_test::reg_files(ctx.get(), dir, {{}, {1, 2}, {}});
     EXPECT_EQ(kova_set_thickness(ctx.get(), 1.0), KOVA_OK);
     EXPECT_EQ(set->thickness, 1.0);
     EXPECT_EQ(ctx->eq->low_gain, 1.2);
