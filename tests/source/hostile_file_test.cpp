@@ -27,61 +27,57 @@ struct Base {
     }
 };
 
-// Reads `bytes` as a set and checks what the engine relies on. That every query answers any file
-// that opens is a property of the set-file fuzzer, checked on every input it replays or makes.
-int probe(const std::string& path, const Bytes& bytes, KOVA_SRCSET** keep = nullptr) {
-    write_file(path, bytes);
-    KOVA_SRCSET* set = make_set();
-    const int rc = kova_open_source(set, path.c_str());
-    EXPECT_LE(set->filters->count, 64u);
-    for (NODE* n = set->filters->head->next; n != set->filters->tail; n = n->next) {
-        const auto* d = static_cast<KOVA_FLT_DSC*>(n->data);
-        EXPECT_TRUE(d->type < 4 && d->channels <= 8);
+// `bytes` written to `path` and read as a set, checked for what the engine relies on. That every
+// query answers any file that opens is a property of the set-file fuzzer, checked on every input
+// it replays or makes.
+struct Probe : Read {
+    Probe(const std::string& path, const Bytes& bytes) : Read((write_file(path, bytes), path)) {
+        EXPECT_LE(set->filters->count, 64u);
+        for (NODE* n = set->filters->head->next; n != set->filters->tail; n = n->next) {
+            const auto* d = static_cast<KOVA_FLT_DSC*>(n->data);
+            EXPECT_TRUE(d->type < 4 && d->channels <= 8);
+        }
+        for (int slot = 0; slot < 3; ++slot) {
+            const KOVA_SRC* s = set->src[slot];
+            if (!s) continue;
+            EXPECT_TRUE(s->size >= 0 && s->size <= (slot == 1 ? 192000 : 38400));
+            EXPECT_TRUE(s->rpt_start >= 0 && s->rpt_start <= s->size && s->rpt_end >= 0 &&
+                        s->rpt_end <= s->size && s->pos == 0);
+        }
     }
-    for (int slot = 0; slot < 3; ++slot) {
-        const KOVA_SRC* s = set->src[slot];
-        if (!s) continue;
-        EXPECT_TRUE(s->size >= 0 && s->size <= (slot == 1 ? 192000 : 38400));
-        EXPECT_TRUE(s->rpt_start >= 0 && s->rpt_start <= s->size && s->rpt_end >= 0 &&
-                    s->rpt_end <= s->size && s->pos == 0);
-    }
-    keep ? void(*keep = set) : kova_free_sourceset(set);
-    return rc;
-}
+};
 
 TEST(HostileFile, EveryTruncationReadsWhatIsThereAndNothingElse) {
     Base b;
     for (size_t len = 0; len <= b.file.size(); ++len) {
         SCOPED_TRACE(len);
-        KOVA_SRCSET* set = nullptr;
-        ASSERT_EQ(probe(b.path, Bytes(b.file.begin(), b.file.begin() + len), &set), KOVA_OK);
+        const Probe p(b.path, Bytes(b.file.begin(), b.file.begin() + len));
+        ASSERT_EQ(p.rc, KOVA_OK);
         // A descriptor cut short counts (zeros where the file ended).
-        EXPECT_EQ(set->filters->count, len < 4 ? 0 : std::min<size_t>(2, (len + 35) / 40));
+        EXPECT_EQ(p.set->filters->count, len < 4 ? 0 : std::min<size_t>(2, (len + 35) / 40));
         // end_gain lies at 164..171; where the file ends the record keeps its earlier -7.
-        EXPECT_TRUE((len > 164 && len < 172) || set->tune->end_gain == (len >= 172 ? 0.6 : -7));
+        EXPECT_TRUE((len > 164 && len < 172) || p.set->tune->end_gain == (len >= 172 ? 0.6 : -7));
         for (int slot = 0; slot < 3; ++slot) {
             const size_t payload = kRecord[slot] + 48;
             const size_t kept = len > payload ? std::min(b.pcm[slot].size(), len - payload) : 0;
-            const KOVA_SRC* s = set->src[slot];
+            const KOVA_SRC* s = p.set->src[slot];
             // A record read in part is a source holding what of its payload was there.
             ASSERT_EQ(s != nullptr, len > kRecord[slot]) << slot;
             EXPECT_TRUE(!s ||
                         (s->size == int32_t(kept) && !memcmp(s->pcm, b.pcm[slot].data(), kept)));
         }
-        kova_free_sourceset(set);
     }
 }
 
 TEST(HostileFile, CountsAboveTheLimitRefuseTheFileUntouched) {
     Base b;
     for (const char* count : {"\x41\0\0\0", "\xff\xff\xff\x7f"}) {  // 65, INT32_MAX
-        KOVA_SRCSET* set = nullptr;
-        EXPECT_EQ(probe(b.path, b.with(0, count), &set), KOVA_ERR_INVALID_PARAM);
-        EXPECT_TRUE(set->filters->count == 0 && set->tune->file_gain == -7 && !set->src[1]);
-        kova_free_sourceset(set);
+        const Probe p(b.path, b.with(0, count));
+        EXPECT_EQ(p.rc, KOVA_ERR_INVALID_PARAM);
+        EXPECT_TRUE(p.set->filters->count == 0 && p.set->tune->file_gain == -7 && !p.set->src[1]);
     }
     for (const char* count : {"\x40\0\0\0", "\x03\0\0\0", "\xfb\xff\xff\xff", "\0\0\0\x80"}) {
-        EXPECT_EQ(probe(b.path, b.with(0, count)), KOVA_OK);  // 64, 3, -5, INT32_MIN read on
+        EXPECT_EQ(Probe(b.path, b.with(0, count)).rc, KOVA_OK);  // 64, 3, -5, INT32_MIN read on
     }
     // The queries follow any count: the descriptors there are read, the tune set lies past
     // the end of the file and keeps what the caller had (apart from the gain adjustment).
@@ -100,41 +96,35 @@ TEST(HostileFile, CountsAboveTheLimitRefuseTheFileUntouched) {
 
 TEST(HostileFile, BadDescriptorsSizesSlotsAndRepeatPoints) {
     Base b;
-    KOVA_SRCSET* set = nullptr;
     Bytes f = b.with(4, "\x04\0\0\0");                  // type 4
     std::memcpy(f.data() + 76, "\x40\x42\x0f\x00", 4);  // 1000000 channels
     std::memcpy(f.data() + kRecord[0] + 32, "\2\0\0\0\0\0\0\0\xfb\xff\xff\xff\x3f\x42\x0f", 16);
     std::memcpy(f.data() + kRecord[2] + 24, "\xff\xff\xff\x7f", 4);  // INT32_MAX bytes
-    ASSERT_EQ(probe(b.path, f, &set), KOVA_OK);
-    EXPECT_EQ(set->filters->count, 0u);
-    EXPECT_EQ(memcmp(set->src[1]->pcm_proc, b.pcm[1].data(), 3000), 0);  // nothing filtered
+    const Probe p(b.path, f);
+    ASSERT_EQ(p.rc, KOVA_OK);
+    EXPECT_EQ(p.set->filters->count, 0u);
+    EXPECT_EQ(memcmp(p.set->src[1]->pcm_proc, b.pcm[1].data(), 3000), 0);  // nothing filtered
     // Slot 2, repeat -5..999999 stored for the start source; 500 bytes held for the end one.
     // The stored slot field is kept (nothing indexes by it).
-    EXPECT_TRUE(set->src[0]->slot == 2 && set->src[0]->rpt_start == 0 &&
-                set->src[0]->rpt_end == 1000);
-    EXPECT_EQ(set->src[2]->size, 500);
-    kova_free_sourceset(set);
+    const KOVA_SRC* start = p.set->src[0];
+    EXPECT_TRUE(start->slot == 2 && start->rpt_start == 0 && start->rpt_end == 1000);
+    EXPECT_EQ(p.set->src[2]->size, 500);
     // A negative size names no payload: the slot stays empty. Size 0 is an empty source.
-    ASSERT_EQ(probe(b.path, b.with(kRecord[0] + 24, "\xff\xff\xff\xff"), &set), KOVA_OK);
-    EXPECT_EQ(set->src[0], nullptr);
-    kova_free_sourceset(set);
-    ASSERT_EQ(probe(b.path, b.with(kRecord[0] + 24, "\0\0\0\0"), &set), KOVA_OK);
-    ASSERT_NE(set->src[0], nullptr);
-    EXPECT_EQ(set->src[0]->size, 0);
-    kova_free_sourceset(set);
-    ASSERT_EQ(probe(b.path, b.with(176, "\2\0\0\0"), &set), KOVA_OK);  // has_src 2: absent
-    EXPECT_EQ(set->src[1], nullptr);
-    kova_free_sourceset(set);
+    EXPECT_EQ(Probe(b.path, b.with(kRecord[0] + 24, "\xff\xff\xff\xff")).set->src[0], nullptr);
+    const Probe empty(b.path, b.with(kRecord[0] + 24, "\0\0\0\0"));
+    ASSERT_NE(empty.set->src[0], nullptr);
+    EXPECT_EQ(empty.set->src[0]->size, 0);
+    EXPECT_EQ(Probe(b.path, b.with(176, "\2\0\0\0")).set->src[1], nullptr);  // has_src 2: absent
     // Oversized payloads are cut at the slot limit and the next record is still found.
     save(make_set({}, tune(0, 0.4), make_src(0, pattern(50000, 4), 0, 50000),
                   make_src(1, pattern(300000, 5), 0, 300000), make_src(2, b.pcm[2], 0, 500)),
          b.path);
-    ASSERT_EQ(probe(b.path, read_file(b.path), &set), KOVA_OK);
-    EXPECT_TRUE(set->src[0]->size == 38400 &&
-                !memcmp(set->src[0]->pcm, pattern(38400, 4).data(), 38400));
-    EXPECT_TRUE(set->src[1]->size == 192000 && set->src[1]->rpt_end == 192000);
-    EXPECT_EQ(memcmp(set->src[2]->pcm, b.pcm[2].data(), 500), 0);
-    kova_free_sourceset(set);
+    const Probe big(b.path, read_file(b.path));
+    ASSERT_EQ(big.rc, KOVA_OK);
+    EXPECT_TRUE(big.set->src[0]->size == 38400 &&
+                !memcmp(big.set->src[0]->pcm, pattern(38400, 4).data(), 38400));
+    EXPECT_TRUE(big.set->src[1]->size == 192000 && big.set->src[1]->rpt_end == 192000);
+    EXPECT_EQ(memcmp(big.set->src[2]->pcm, b.pcm[2].data(), 500), 0);
 }
 
 TEST(HostileFile, QueriesStayInRangeOnBadValues) {

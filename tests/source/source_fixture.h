@@ -77,6 +77,16 @@ inline KOVA_SRCSET* make_set(const std::vector<KOVA_FLT_DSC>& filters = {},
     return set;
 }
 
+// A set read from `path` into an empty set (make_set()), with the reader's result.
+struct Read {
+    KOVA_SRCSET* set = make_set();
+    int rc;
+    explicit Read(const std::string& path) : rc(kova_open_source(set, path.c_str())) {}
+    ~Read() { kova_free_sourceset(set); }
+    Read(const Read&) = delete;
+    Read& operator=(const Read&) = delete;
+};
+
 // Saves `set` through the access layer and releases it; returns the writer's sum.
 inline int save(KOVA_SRCSET* set, const std::string& path, int rate = 48000, int channels = 2) {
     TARQ_MFAL m;
