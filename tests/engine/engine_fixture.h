@@ -30,6 +30,11 @@ inline CtxPtr make_ctx(uint32_t rate = 48000, uint32_t channels = 2, uint32_t p 
     return CtxPtr(kova_init(&f, &err));
 }
 
+// The tune set a registration from files gives.
+inline KOVA_TUNE_SET file_tune() {
+    return KOVA_TUNE_SET{1.0, 0.4, 0, 1.0, 0, 0.2, 0.0, 0.4, 0.6, 0.9, 0.6};
+}
+
 // The registered set with a 1-based identifier the test knows to exist.
 inline KOVA_SRCSET* set_of(KOVA_CTX* ctx, int id) {
     return static_cast<KOVA_SRCSET*>(

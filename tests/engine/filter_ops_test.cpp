@@ -129,23 +129,20 @@ TEST_F(FilterOps, ReplacingFilesKeepsOtherSlotsAndReportsAnEmptyLoop) {
 TEST_F(FilterOps, RefusalsAndFailuresLeaveTheContextAlone) {
     ASSERT_EQ(kova_reg_src_byfilter(ctx, &kLow, &err), 1);
     const std::vector<int16_t> before(set(1)->src[1]->pcm_proc, set(1)->src[1]->pcm_proc + 96000);
-    std::vector<KOVA_FLT_DSC> bad(14, kBand);
-    bad[0].type = 4;
-    bad[1].samplerate = 0;
-    bad[2].samplerate = -48000;
-    bad[3].samplerate = 400000;
-    bad[4].freq = 0.0;
-    bad[5].freq = 24000.0;  // Nyquist
-    bad[6].freq = NAN;
-    bad[7].bandwidth = 0.0;
-    bad[8].bandwidth = 24000.0;
-    bad[9].bandwidth = INFINITY;
-    bad[10].channels = 0;
-    bad[11].channels = 3;
-    bad[12] = kLow;
-    bad[12].freq = -1.0;
-    bad[13] = kLow;
-    bad[13].bandwidth = NAN;
+    // Each row the valid band-pass (or low-pass) with one field made degenerate.
+    const auto with = [](KOVA_FLT_DSC d, auto KOVA_FLT_DSC::*field, auto value) {
+        d.*field = value;
+        return d;
+    };
+    using D = KOVA_FLT_DSC;
+    const KOVA_FLT_DSC bad[] = {
+        with(kBand, &D::type, 4u),           with(kBand, &D::samplerate, 0),
+        with(kBand, &D::samplerate, -48000), with(kBand, &D::samplerate, 400000),
+        with(kBand, &D::freq, 0.0),          with(kBand, &D::freq, 24000.0),  // Nyquist
+        with(kBand, &D::freq, NAN),          with(kBand, &D::bandwidth, 0.0),
+        with(kBand, &D::bandwidth, 24000.0), with(kBand, &D::bandwidth, INFINITY),
+        with(kBand, &D::channels, 0),        with(kBand, &D::channels, 3),
+        with(kLow, &D::freq, -1.0),          with(kLow, &D::bandwidth, NAN)};
     for (const KOVA_FLT_DSC& d : bad) {
         EXPECT_EQ(kova_reg_src_byfilter(ctx, &d, &err), 0);
         EXPECT_EQ(err, KOVA_ERR_INVALID_PARAM);

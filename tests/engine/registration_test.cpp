@@ -5,11 +5,10 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <atomic>
 #include <chrono>
 #include <filesystem>
+#include <future>
 #include <string>
-#include <thread>
 #include <vector>
 
 #include "engine/engine_fixture.h"
@@ -25,22 +24,12 @@ const KOVA_FLT_DSC kLowpass{KOVA_FLT_LOWPASS, 2000.0, 0.0, 1, 48000, 2};
  * on `fifo` is then set free by opening the other end, so a regression fails instead of hanging. */
 template <typename Call>
 bool returns_promptly(Call call, const std::string& fifo) {
-    std::atomic<bool> done{false};
-    std::thread worker([&] {
-        call();
-        done = true;
-    });
-    const auto give_up = std::chrono::steady_clock::now() + std::chrono::seconds(5);
-    while (!done && std::chrono::steady_clock::now() < give_up) {
-        std::this_thread::sleep_for(std::chrono::milliseconds(1));
-    }
-    const bool prompt = done;
-    while (!done) {
+    std::future<void> done = std::async(std::launch::async, call);
+    const bool prompt = done.wait_for(std::chrono::seconds(5)) == std::future_status::ready;
+    while (done.wait_for(std::chrono::milliseconds(1)) != std::future_status::ready) {
         const int fd = open(fifo.c_str(), O_WRONLY | O_NONBLOCK);
         if (fd >= 0) close(fd);
-        std::this_thread::sleep_for(std::chrono::milliseconds(1));
     }
-    worker.join();
     return prompt;
 }
 

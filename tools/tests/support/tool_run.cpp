@@ -100,9 +100,7 @@ RunResult run_kova(const std::vector<std::string>& args, const std::string& dir,
 
 std::string read_file(const std::string& path) {
     std::ifstream in(path, std::ios::binary);
-    std::stringstream ss;
-    ss << in.rdbuf();
-    return ss.str();
+    return {std::istreambuf_iterator<char>(in), {}};
 }
 
 void write_file(const std::string& path, const std::string& bytes) {
@@ -121,9 +119,7 @@ bool has(const std::string& text, const std::string& part) {
 int count_lines(const std::string& text) {
     int n = 0;
     std::istringstream in(text);
-    for (std::string line; std::getline(in, line);) {
-        if (!line.empty()) ++n;
-    }
+    for (std::string line; std::getline(in, line);) n += !line.empty();
     return n;
 }
 
