@@ -186,11 +186,9 @@ class Session {
             t.osc_depth = scaled(in.take<uint8_t>(), -0.1, 1.1);
             t.sharp_enable = in.take<uint8_t>() & 1;
             t.sharpness = scaled(in.take<uint8_t>(), -0.1, 1.1);
-            t.wn_gain = scaled(in.take<uint8_t>(), 0.0, 1.0);
-            t.file_gain = scaled(in.take<uint8_t>(), 0.0, 1.0);
-            t.start_gain = scaled(in.take<uint8_t>(), 0.0, 1.5);
-            t.loop_gain = scaled(in.take<uint8_t>(), 0.0, 1.5);
-            t.end_gain = scaled(in.take<uint8_t>(), 0.0, 1.5);
+            for (double* v : {&t.wn_gain, &t.file_gain}) *v = scaled(in.take<uint8_t>(), 0.0, 1.0);
+            for (double* v : {&t.start_gain, &t.loop_gain, &t.end_gain})
+                *v = scaled(in.take<uint8_t>(), 0.0, 1.5);
         }
         const int32_t active = kova_get_src_num(ctx_);  // the newest set is the usual active one
         kova_set_tuneset(ctx_, active, &t);

@@ -78,8 +78,8 @@ TEST(TuneTest, ThicknessAndVolume) {
     EXPECT_EQ(ctx->eq->low_gain, 1.2);
     EXPECT_EQ(ctx->eq->slew_decay, 1.0);
 
-    EXPECT_EQ(kova_set_volume(ctx.get(), 0.5), KOVA_OK);
-    EXPECT_EQ(ctx->volume, 0.4);
+    // 0.5 gives 0.4 through the Java method (Methods.TuningThicknessAndVolumeReachTheEngine);
+    // above 1 is taken too.
     EXPECT_EQ(kova_set_volume(ctx.get(), 2.0), KOVA_OK);
     EXPECT_EQ(ctx->volume, 1.6);
 }
