@@ -55,7 +55,7 @@ inline KOVA_SRCSET* reg_files(KOVA_CTX* ctx, const TempDir& dir,
     int32_t err = 0;
     const int32_t id = kova_reg_src_byfiles(ctx, p, &err);
     EXPECT_GT(id, 0);
-    return set_of(ctx, id);
+    return id > 0 ? set_of(ctx, id) : nullptr;
 }
 
 // The eleven tune values in record order, for whole-record comparisons.

@@ -77,17 +77,14 @@ TEST_F(FilterOps, AttachReplacesSameTypeAndAppendsNewOnes) {
 }
 
 TEST_F(FilterOps, UpdateRereadsFilesAndRefiltersEverySource) {
-    const std::string s = dir.write("s.pcm", sine(300, 2000)),
-                      l = dir.write("l.pcm", sine(300, 8000));
-    const char* paths[3] = {s.c_str(), l.c_str(), nullptr};
-    ASSERT_EQ(kova_reg_src_byfiles(ctx, paths, &err), 1);
+    kova_test::reg_files(ctx, dir, {sine(300, 2000), sine(300, 8000), {}});
     ASSERT_EQ(kova_attach_filter(ctx, 1, &kLow, &err), 1);
     const double low_level =
         rms(set(1)->src[1]->pcm_proc, 16000);  // 300 Hz passes the 500 Hz low-pass
     set(1)->src[0]->pos = 7;
     set(1)->src[1]->pos = 11;
 
-    dir.write("l.pcm", sine(6000, 8000));  // the loop file changes on disk
+    const std::string l = dir.write("slot1", sine(6000, 8000));  // the loop file changes on disk
     KOVA_FLT_DSC low2 = kLow;
     low2.freq = 400.0;
     ASSERT_EQ(kova_update_filter(ctx, 1, &low2, &err), 1);
