@@ -332,6 +332,12 @@ void pan_finished(int16_t* out, int64_t len, const double pan_gain[2]) {
     }
 }
 
+// A start or end sound's equaliser inputs: each sample times the gain, truncated.
+void once_inputs(const int16_t* src, double gain, double* x, int64_t len) {
+    for (int64_t i = 0; i < len; ++i) x[i] = gain * src[i];
+    truncate_inputs(x, len);
+}
+
 // Start and end sounds: first pass (gain, truncation), the serial pass, then with panning the
 // pan gain on the finished samples, which depends on nothing serial and runs vectorised.
 template <bool kPan>
@@ -342,10 +348,8 @@ void once_blocks(KOVA_EQ* eq, const int16_t* pcm, int64_t count, double gain,
     PostState ps{1.0, {0, 0}};
     for (int64_t done = 0; done < count; done += kChunk) {
         const int64_t len = (count - done < kChunk) ? count - done : kChunk;
-        const int16_t* src = pcm + done;
         int16_t* out = dst + done;
-        for (int64_t i = 0; i < len; ++i) x[i] = gain * src[i];
-        truncate_inputs(x, len);
+        once_inputs(pcm + done, gain, x, len);
         serial_pass_for<Post::none, false>(eq, x, len, out, ps, nullptr, unused_c, 0.0);
         if (kPan) pan_finished(out, len, pan_gain);
     }
@@ -371,10 +375,8 @@ bool once_lanes(KOVA_EQ* eq, const int16_t* pcm, int64_t count, double gain, con
     const double lg = eq->low_gain, mg = eq->mid_gain, hg = eq->high_gain;
     for (int64_t done = 0; done < count; done += piece) {
         const int64_t len = (count - done < piece) ? count - done : piece;
-        const int16_t* src = pcm + done;
         int16_t* out = dst + done;
-        for (int64_t i = 0; i < len; ++i) x[i] = gain * src[i];
-        truncate_inputs(x, len);
+        once_inputs(pcm + done, gain, x, len);
         for (int64_t i = 0; i < len; ++i) x[i] = normalised_integer(x[i]);
         eq_lane_states(eq, x, len, st);
         eq->low_state = st[2 * len - 2];
