@@ -76,7 +76,8 @@ int32_t gen_once(KOVA_CTX* ctx, bool is_end, KOVA_PCMBUF* out, const GenBlock& b
         n = (avail < out->size / 2) ? avail : out->size / 2;
         const double slot_gain = is_end ? b.tune->end_gain : b.tune->start_gain;
         const double g = b.tune->gain * slot_gain * ctx->volume * b.level;
-        kova_gen::render_once(ctx->eq, src->pcm_proc, n, g, b.pan_gain, out->data);
+        kova_gen::render_once(ctx->eq, src->pcm_proc, n, g, b.pan_gain, out->data, ctx->work_buf,
+                              KOVA_WORK_BUF_BYTES);
     }
     if (is_end) b.loop->pos = 0;
     return n;

@@ -67,6 +67,61 @@ inline double normalised(double sample) {
     return sample / 2147483647.0;
 }
 
+// Equaliser outputs to 16 bits: trunc_sat32 (NaN gives 0), then values beyond 16 bits pinned to
+// the clip thresholds, which the caller replaces in order; a pinned value stands for every
+// output at or beyond its threshold, as clipped() tests them. Returns whether any was pinned.
+// The vector forms narrow with saturation; on x86 a pair the conversion marks (NaN, out of
+// range) takes the exact scalar form, as in truncate_inputs().
+bool to_16_bits(const double* y, int64_t len, int16_t* out) {
+    int64_t i = 0;
+    bool pinned = false;
+#if defined(__SSE2__)
+    const __m128i marked = _mm_set1_epi32(INT32_MIN);
+    const __m128i high = _mm_set1_epi16(kClipHigh);
+    const __m128i low = _mm_set1_epi16(kClipLow);
+    __m128i at_limit = _mm_setzero_si128();
+    for (; i + 7 < len; i += 8) {
+        const __m128i a = _mm_unpacklo_epi64(_mm_cvttpd_epi32(_mm_loadu_pd(y + i)),
+                                             _mm_cvttpd_epi32(_mm_loadu_pd(y + i + 2)));
+        const __m128i b = _mm_unpacklo_epi64(_mm_cvttpd_epi32(_mm_loadu_pd(y + i + 4)),
+                                             _mm_cvttpd_epi32(_mm_loadu_pd(y + i + 6)));
+        const __m128i bad = _mm_or_si128(_mm_cmpeq_epi32(a, marked), _mm_cmpeq_epi32(b, marked));
+        if (_mm_movemask_epi8(bad)) [[unlikely]]
+            break;
+        const __m128i p = _mm_packs_epi32(a, b);
+        at_limit =
+            _mm_or_si128(at_limit, _mm_or_si128(_mm_cmpeq_epi16(p, high), _mm_cmpeq_epi16(p, low)));
+        _mm_storeu_si128(reinterpret_cast<__m128i*>(out + i), p);
+    }
+    pinned = _mm_movemask_epi8(at_limit) != 0;
+#elif defined(__aarch64__)
+    const int16x8_t high = vdupq_n_s16(kClipHigh);
+    const int16x8_t low = vdupq_n_s16(kClipLow);
+    uint16x8_t at_limit = vdupq_n_u16(0);
+    for (; i + 7 < len; i += 8) {
+        int32x4_t w[2];
+        for (int h = 0; h < 2; ++h) {
+            const double* q = y + i + 4 * h;
+            w[h] = vcombine_s32(vqmovn_s64(vcvtq_s64_f64(vld1q_f64(q))),
+                                vqmovn_s64(vcvtq_s64_f64(vld1q_f64(q + 2))));
+        }
+        const int16x8_t p = vcombine_s16(vqmovn_s32(w[0]), vqmovn_s32(w[1]));
+        at_limit = vorrq_u16(at_limit, vorrq_u16(vceqq_s16(p, high), vceqq_s16(p, low)));
+        vst1q_s16(out + i, p);
+    }
+    pinned = vmaxvq_u16(at_limit) != 0;
+#endif
+    for (; i < len; ++i) {
+        int32_t r = kova::dsp::trunc_sat32(y[i]);
+        if (r >= kClipHigh || r <= kClipLow) {
+            pinned = true;
+            r = r >= kClipHigh ? kClipHigh : kClipLow;
+        }
+        out[i] = static_cast<int16_t>(r);
+    }
+    return pinned;
+}
+
 // What follows the equaliser and the clipper: nothing (pitch-raise staging, start and end
 // sounds) or the slew limiter (plain moves).
 enum class Post { none, slew };
@@ -230,6 +285,59 @@ void loop_blocks_by_factors(KOVA_EQ* eq, LoopRender& r, int16_t* dst, int64_t co
     }
 }
 
+// The pan gain of its parity on each finished sample (`out` starts on an even sample), truncated
+// and saturated to 32 bits like trunc_sat32, then its low 16 bits. On x86 a group with a pair the
+// conversion marks (a NaN or out-of-range product, from a pan depth no setter allows) takes the
+// exact scalar form, as in truncate_inputs().
+void pan_finished(int16_t* out, int64_t len, const double pan_gain[2]) {
+    int64_t i = 0;
+#if defined(__SSE2__)
+    const __m128d gain = _mm_set_pd(pan_gain[1], pan_gain[0]);
+    const __m128i marked = _mm_set1_epi32(INT32_MIN);
+    auto panned = [&](__m128i four) {  // four int32 samples, even first
+        const __m128i a = _mm_cvttpd_epi32(_mm_mul_pd(_mm_cvtepi32_pd(four), gain));
+        const __m128i b =
+            _mm_cvttpd_epi32(_mm_mul_pd(_mm_cvtepi32_pd(_mm_shuffle_epi32(four, 0xEE)), gain));
+        return _mm_unpacklo_epi64(a, b);
+    };
+    for (; i + 7 < len; i += 8) {
+        const __m128i s = _mm_loadu_si128(reinterpret_cast<const __m128i*>(out + i));
+        const __m128i a = panned(_mm_srai_epi32(_mm_unpacklo_epi16(s, s), 16));
+        const __m128i b = panned(_mm_srai_epi32(_mm_unpackhi_epi16(s, s), 16));
+        const __m128i off = _mm_or_si128(_mm_cmpeq_epi32(a, marked), _mm_cmpeq_epi32(b, marked));
+        if (_mm_movemask_epi8(off)) [[unlikely]]
+            break;
+        // The low 16 bits of each, sign-extended, so the saturating pack keeps them as they are.
+        const __m128i low_a = _mm_srai_epi32(_mm_slli_epi32(a, 16), 16);
+        const __m128i low_b = _mm_srai_epi32(_mm_slli_epi32(b, 16), 16);
+        _mm_storeu_si128(reinterpret_cast<__m128i*>(out + i), _mm_packs_epi32(low_a, low_b));
+    }
+#elif defined(__aarch64__)
+    const float64x2_t gain = {pan_gain[0], pan_gain[1]};
+    auto panned = [&](int32x2_t two) {
+        return vqmovn_s64(vcvtq_s64_f64(vmulq_f64(vcvtq_f64_s64(vmovl_s32(two)), gain)));
+    };
+    for (; i + 7 < len; i += 8) {
+        const int16x8_t s = vld1q_s16(out + i);
+        const int32x4_t lo = vmovl_s16(vget_low_s16(s));
+        const int32x4_t hi = vmovl_s16(vget_high_s16(s));
+        const int32x4_t a = vcombine_s32(panned(vget_low_s32(lo)), panned(vget_high_s32(lo)));
+        const int32x4_t b = vcombine_s32(panned(vget_low_s32(hi)), panned(vget_high_s32(hi)));
+        vst1q_s16(out + i, vcombine_s16(vmovn_s32(a), vmovn_s32(b)));
+    }
+#endif
+    for (; i < len; ++i) {
+        const int32_t v = kova::dsp::trunc_sat32(out[i] * pan_gain[i & 1]);
+        out[i] = static_cast<int16_t>(v);
+    }
+}
+
+// A start or end sound's equaliser inputs: each sample times the gain, truncated.
+void once_inputs(const int16_t* src, double gain, double* x, int64_t len) {
+    for (int64_t i = 0; i < len; ++i) x[i] = gain * src[i];
+    truncate_inputs(x, len);
+}
+
 // Start and end sounds: first pass (gain, truncation), the serial pass, then with panning the
 // pan gain on the finished samples, which depends on nothing serial and runs vectorised.
 template <bool kPan>
@@ -238,28 +346,63 @@ void once_blocks(KOVA_EQ* eq, const int16_t* pcm, int64_t count, double gain,
     alignas(64) double x[kChunk];
     double unused_c = 0.0;
     PostState ps{1.0, {0, 0}};
-    const double pan_even = pan_gain[0];
-    const double pan_odd = pan_gain[1];
     for (int64_t done = 0; done < count; done += kChunk) {
         const int64_t len = (count - done < kChunk) ? count - done : kChunk;
-        const int16_t* src = pcm + done;
         int16_t* out = dst + done;
-        for (int64_t i = 0; i < len; ++i) x[i] = gain * src[i];
-        truncate_inputs(x, len);
+        once_inputs(pcm + done, gain, x, len);
         serial_pass_for<Post::none, false>(eq, x, len, out, ps, nullptr, unused_c, 0.0);
-        if (kPan) {
-            // Each finished sample times the pan gain of its parity (chunks start on an even
-            // sample), truncated and saturated to 32 bits like trunc_sat32, then its low 16 bits.
-            int64_t i = 0;
-            for (; i + 1 < len; i += 2) {
-                x[i] = out[i] * pan_even;
-                x[i + 1] = out[i + 1] * pan_odd;
-            }
-            if (i < len) x[i] = out[i] * pan_even;
-            truncate_inputs(x, len);
-            for (i = 0; i < len; ++i) out[i] = static_cast<int16_t>(static_cast<int32_t>(x[i]));
-        }
+        if (kPan) pan_finished(out, len, pan_gain);
     }
+}
+
+// A long start or end sound, piece by piece as the scratch holds it: the equaliser inputs, the
+// sections' states on lanes (eq_lanes.cpp), the outputs from the states, which no longer form a
+// chain and run vectorised, then clipping in order and the pan gain. The same operations in the
+// same order as once_blocks(), so the same bits. Scratch per piece: the inputs behind the three
+// delayed ones the first outputs need, and a state pair per sample.
+bool once_lanes(KOVA_EQ* eq, const int16_t* pcm, int64_t count, double gain, const double* pan_gain,
+                int16_t* dst, void* scratch, int64_t scratch_bytes) {
+    const int64_t max_piece = ((scratch_bytes / int64_t{sizeof(double)} - 3) / 3) & ~int64_t{1};
+    if (count < eq_lane_min_run() || max_piece < eq_lane_min_run()) return false;
+    const int64_t pieces = (count + max_piece - 1) / max_piece;
+    const int64_t piece = ((count + pieces - 1) / pieces + 1) & ~int64_t{1};  // even: parity
+    auto* xb = static_cast<double*>(scratch);
+    double* x = xb + 3;
+    double* st = x + piece;
+    xb[0] = eq->hist[2];
+    xb[1] = eq->hist[1];
+    xb[2] = eq->hist[0];
+    const double lg = eq->low_gain, mg = eq->mid_gain, hg = eq->high_gain;
+    for (int64_t done = 0; done < count; done += piece) {
+        const int64_t len = (count - done < piece) ? count - done : piece;
+        int16_t* out = dst + done;
+        once_inputs(pcm + done, gain, x, len);
+        for (int64_t i = 0; i < len; ++i) x[i] = normalised_integer(x[i]);
+        eq_lane_states(eq, x, len, st);
+        eq->low_state = st[2 * len - 2];
+        eq->high_state = st[2 * len - 1];
+        // Output i from its states and the input three samples back (xb[i]), into xb[i].
+        for (int64_t i = 0; i < len; ++i) {
+            const double low = st[2 * i];
+            const double delayed = xb[i];
+            const double high = delayed - st[2 * i + 1];
+            const double mid = delayed - (low + high);
+            xb[i] = (high * hg + (low * lg + mid * mg)) * 2147483647.0;
+        }
+        if (to_16_bits(xb, len, out)) {
+            for (int64_t i = 0; i < len; ++i) {
+                if (out[i] == kClipHigh || out[i] == kClipLow) out[i] = clipped(out[i]);
+            }
+        }
+        if (!(pan_gain[0] == 1.0 && pan_gain[1] == 1.0)) pan_finished(out, len, pan_gain);
+        xb[0] = x[len - 3];
+        xb[1] = x[len - 2];
+        xb[2] = x[len - 1];
+    }
+    eq->hist[0] = xb[2];
+    eq->hist[1] = xb[1];
+    eq->hist[2] = xb[0];
+    return true;
 }
 
 }  // namespace
@@ -274,8 +417,9 @@ void render_loop(KOVA_EQ* eq, LoopRender& r, int16_t* dst, int64_t count) {
 }
 
 void render_once(KOVA_EQ* eq, const int16_t* pcm, int64_t count, double gain,
-                 const double pan_gain[2], int16_t* dst) {
+                 const double pan_gain[2], int16_t* dst, void* scratch, int64_t scratch_bytes) {
     if (count < 1) return;
+    if (once_lanes(eq, pcm, count, gain, pan_gain, dst, scratch, scratch_bytes)) return;
     // The pan gain multiplies the finished sample; a gain of 1.0 keeps it as it is.
     if (pan_gain[0] == 1.0 && pan_gain[1] == 1.0) {
         once_blocks<false>(eq, pcm, count, gain, pan_gain, dst);

@@ -308,41 +308,43 @@ TEST_F(JavaContract, MethodsRefuseIdsWithoutInstanceOrContext) {
     using namespace fake_jni;
     ASSERT_EQ(jni_test::init_default(), 1);
     KovaInstance* inst = pKOVAInfo[0].pInstance;
+    pthread_mutex_t* lock = gpKovaMutex;
     String s{"/nonexistent"};
     Array<jbyte> out(64, 0x5a);
     kova_test::LogCapture cap;
     g_got = g_released = 0;
     // Checked inside: the rows' calls refer to this call's arguments.
     auto check_id = [&](jlong id, double reg) {
-        JNIEnv* e = env();
         check({
-            R(Java_com_corvane_audio_Kova_reg_1src_1byfiles(e, nullptr, id, jstr(s), jstr(s),
-                                                            jstr(s)),
-              reg),
-            R(Java_com_corvane_audio_Kova_set_1src(e, nullptr, id, 1), kBad),
-            R(Java_com_corvane_audio_Kova_get_1src_1num(e, nullptr, id), 0),
-            R(Java_com_corvane_audio_Kova_gen_1sounds(e, nullptr, id, jbytes(out), 1, 1, 0, 0, 0),
-              0),
-            R(Java_com_corvane_audio_Kova_gen_1tofasttrack(e, nullptr, id, 1, 1, 0, 0, 0), 0),
-            R(Java_com_corvane_audio_Kova_set_1tuneset(e, nullptr, id, 1, 1, .3, 1, .5, 0, .2, 0,
-                                                       .4, .6, .9, .6),
-              kBad),
-            R(Java_com_corvane_audio_Kova_set_1thickness(e, nullptr, id, 0.5), kBad),
-            R(Java_com_corvane_audio_Kova_set_1volume(e, nullptr, id, 0.5), kBad),
+            R(JAVA(reg_1src_1byfiles, id, jstr(s), jstr(s), jstr(s)), reg),
+            R(JAVA(set_1src, id, 1), kBad),
+            R(JAVA(get_1src_1num, id), 0),
+            R(JAVA(gen_1sounds, id, jbytes(out), 1, 1, 0, 0, 0), 0),
+            R(JAVA(gen_1tofasttrack, id, 1, 1, 0, 0, 0), 0),
+            R(JAVA(set_1tuneset, id, 1, 1, .3, 1, .5, 0, .2, 0, .4, .6, .9, .6), kBad),
+            R(JAVA(set_1thickness, id, 0.5), kBad),
+            R(JAVA(set_1volume, id, 0.5), kBad),
         });
     };
     for (jlong id : {0L, -5L, 21L, 2L}) {
         check_id(id, kBad);
-        Java_com_corvane_audio_Kova_start_1fasttrack(env(), nullptr, id);
-        Java_com_corvane_audio_Kova_stop_1fasttrack(env(), nullptr, id);
+        JAVA(start_1fasttrack, id);
+        JAVA(stop_1fasttrack, id);
+        EXPECT_EQ(jni_test::deinit(id), id == 2 ? 0 : kBad);
     }
     EXPECT_EQ(g_got, 4);  // gen_sounds's array only: no string for these ids
     EXPECT_EQ(g_released, 4);
-    EXPECT_TRUE(cap.lines().empty());
+    // Only deinit speaks, and a refused deinit keeps the registry lock.
+    const std::string d = "kova_deinit()";
+    EXPECT_EQ(jni_test::jni_lines(cap),
+              (jni_test::Lines{d, d, d, d, "instance is NULL. deinit() is failed."}));
+    EXPECT_EQ(cap.lines().size(), 5u);
+    EXPECT_EQ(gpKovaMutex, lock);
     EXPECT_EQ(inst->pFastTrack->state, 0);  // id 1 untouched
 
     KOVA_CTX* ctx = inst->pCtx;
     inst->pCtx = nullptr;
+    cap.clear();
     check_id(1, 0);
     EXPECT_EQ(g_got, 8);  // three strings and the array, all released
     EXPECT_EQ(g_released, 8);
@@ -350,15 +352,15 @@ TEST_F(JavaContract, MethodsRefuseIdsWithoutInstanceOrContext) {
     EXPECT_EQ(jni_test::jni_lines(cap),
               (jni_test::Lines{"kova_set_thickness() is failed. (ID is NULL)",
                                "kova_set_volume() is failed. (ID is NULL)"}));
-    Java_com_corvane_audio_Kova_start_1fasttrack(env(), nullptr, 1);  // the stream is still there
+    JAVA(start_1fasttrack, 1);  // the stream is still there
     EXPECT_EQ(inst->pFastTrack->state, 1);
-    Java_com_corvane_audio_Kova_stop_1fasttrack(env(), nullptr, 1);
+    JAVA(stop_1fasttrack, 1);
     inst->pCtx = ctx;
     EXPECT_EQ(out.items, std::vector<jbyte>(64, 0x5a));
 
     // The last slot's id names an instance like any other.
     for (jlong id = 2; id <= KOVA_MAX_INSTANCES; ++id) ASSERT_EQ(jni_test::init_default(), id);
-    EXPECT_EQ(Java_com_corvane_audio_Kova_set_1volume(env(), nullptr, KOVA_MAX_INSTANCES, 0.5), 0);
+    EXPECT_EQ(JAVA(set_1volume, KOVA_MAX_INSTANCES, 0.5), 0);
 }
 
 }  // namespace

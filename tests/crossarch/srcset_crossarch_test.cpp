@@ -11,7 +11,6 @@
 // each machine reads the other's file, and compares the files of both machines byte for byte.
 #include <gtest/gtest.h>
 
-#include <algorithm>
 #include <cstdint>
 #include <cstring>
 #include <filesystem>
@@ -105,17 +104,6 @@ Bytes read_file(const std::string& path) {
     return Bytes(std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>());
 }
 
-void write_file(const std::string& path, const void* data, size_t n) {
-    std::ofstream(path, std::ios::binary | std::ios::trunc)
-        .write(static_cast<const char*>(data), static_cast<std::streamsize>(n));
-}
-
-// First differing offset, or -1.
-long first_difference(const Bytes& a, const Bytes& b) {
-    const auto at = std::mismatch(a.begin(), a.end(), b.begin(), b.end()).first - a.begin();
-    return a.size() == b.size() && at == static_cast<long>(a.size()) ? -1 : at;
-}
-
 class CrossArch : public testing::Test {
    protected:
     // Builds the set through the engine in a context of its own and saves it as this machine's
@@ -127,13 +115,10 @@ class CrossArch : public testing::Test {
         int32_t err = 0;
         ctx_ = kova_init(&kFormat, &err);
         ASSERT_NE(ctx_, nullptr);
-        std::string paths[3];
-        const char* cpaths[3];
-        for (int slot = 0; slot < 3; ++slot) {
-            paths[slot] = own_dir_.file(".pcm-" + std::to_string(slot));
-            write_file(paths[slot], pcm(slot).data(), static_cast<size_t>(kSizes[slot]));
-            cpaths[slot] = paths[slot].c_str();
-        }
+        const std::string paths[3] = {own_dir_.write("0.pcm", pcm(0)),
+                                      own_dir_.write("1.pcm", pcm(1)),
+                                      own_dir_.write("2.pcm", pcm(2))};
+        const char* cpaths[3] = {paths[0].c_str(), paths[1].c_str(), paths[2].c_str()};
         ASSERT_EQ(kova_reg_src_byfiles(ctx_, cpaths, &err), 1);
         for (const KOVA_FLT_DSC& d : kFilters) EXPECT_EQ(kova_attach_filter(ctx_, 1, &d, &err), 1);
         EXPECT_EQ(kova_set_tuneset(ctx_, 1, &kTune), KOVA_OK);
@@ -175,7 +160,7 @@ TEST_F(CrossArch, FilesFromEveryMachineAreTheImageAndReadTheSame) {
     ASSERT_FALSE(sets.empty());
     for (const std::string& path : sets) {
         SCOPED_TRACE(path);
-        EXPECT_EQ(first_difference(read_file(path), expected), -1);
+        EXPECT_TRUE(read_file(path) == expected);
 
         int off[3] = {-7, -7, -7}, size[3] = {-7, -7, -7};
         ASSERT_EQ(kova_get_pcminfo_fromfile(path.c_str(), &off[0], &size[0], &off[1], &size[1],
@@ -202,7 +187,7 @@ TEST_F(CrossArch, FilesFromEveryMachineAreTheImageAndReadTheSame) {
         const std::string again = own_dir_.file("resaved");
         std::remove(again.c_str());
         ASSERT_GT(kova_save_source(ctx_, id, again.c_str()), 0);
-        EXPECT_EQ(first_difference(read_file(again), expected_file(KOVA_ORIGIN_SAVEFILE)), -1);
+        EXPECT_TRUE(read_file(again) == expected_file(KOVA_ORIGIN_SAVEFILE));
     }
 }
 
@@ -228,12 +213,10 @@ TEST_F(CrossArch, SameStrokeSameSamples) {
     // Stored as 16-bit little-endian, as the device plays it.
     Bytes le;
     for (int16_t s : all) put(le, static_cast<uint16_t>(s), 2);
-    write_file(dir_ + "/gen-" + kArch + ".pcm", le.data(), le.size());
-    for (const std::string& other : files("gen-", ".pcm")) {
-        SCOPED_TRACE(other);
-        const long at = first_difference(read_file(other), le);
-        EXPECT_EQ(at, -1) << "first different sample " << at / 2;
-    }
+    std::ofstream(dir_ + "/gen-" + kArch + ".pcm", std::ios::binary)
+        .write(reinterpret_cast<const char*>(le.data()), static_cast<std::streamsize>(le.size()));
+    for (const std::string& other : files("gen-", ".pcm"))
+        EXPECT_TRUE(read_file(other) == le) << other;
 }
 
 }  // namespace

@@ -225,21 +225,28 @@ TEST_F(GenTest, NonFiniteCoordinatesAreEvents) {
     EXPECT_EQ(ctx->stroke, 0u);
 }
 
-// Start sound with panning depth 0.4: gain 1 * 0.6 * 0.8 * 0.4. First an odd-length varied
-// sound, bit for bit against the documented order (equaliser, then the pan gain on the finished
-// sample) across several of the generator's chunks; then a constant 10000 at both screen edges.
+// Start sound with panning depth 0.4: gain 1 * 0.6 * 0.8 * 0.4. First odd-length varied sounds,
+// bit for bit against the documented order (equaliser, then the pan gain on the finished sample):
+// a short one, then a long one (the equaliser on lanes, in two pieces) twice over, each call
+// going on from the equaliser state the one before left, the last far off the screen, where
+// panned samples pass the 32-bit range. Then a constant 10000 at both edges.
 TEST_F(GenTest, PanGainsFollowPosition) {
-    const std::vector<int16_t> start = kova_test::varied(1001);
-    kova_test::reg_files(ctx.get(), dir, {start, loop, {}});
-    ASSERT_EQ(gen(ctx.get(), event(300, 5, 900, KOVA_ACTION_START), buf), 2002);
     KOVA_EQ eq;
     kova_eq_init(&eq, 880, 5000, 48000);
-    const double q = 0.4 * (300.0f / 1080.0f);
-    const double pan[2] = {1.0 - q, 1.0 - 0.4 + q};
-    for (size_t i = 0; i < start.size(); ++i) {
-        const auto s = static_cast<int16_t>(
-            kova_eq_proc(&eq, static_cast<int32_t>(1.0 * 0.6 * 0.8 * 0.4 * start[i])));
-        ASSERT_EQ(buf[i], static_cast<int16_t>(static_cast<int32_t>(s * pan[i % 2]))) << i;
+    auto sat32 = [](double v) {
+        return v >= 2147483647.0 ? INT32_MAX : v <= -2147483648.0 ? INT32_MIN : int32_t(v);
+    };
+    for (auto [len, x] : {std::pair{1001, 300.0f}, {9001, 300.0f}, {9001, 3e11f}}) {
+        const double q = 0.4 * (x / 1080.0f);
+        const double pan[2] = {1.0 - q, 1.0 - 0.4 + q};
+        const std::vector<int16_t> start = kova_test::varied(len);
+        kova_test::reg_files(ctx.get(), dir, {start, loop, {}});  // the equaliser state goes on
+        ASSERT_EQ(gen(ctx.get(), event(x, 5, 900, KOVA_ACTION_START), buf), 2 * len);
+        for (size_t i = 0; i < start.size(); ++i) {
+            const auto s = static_cast<int16_t>(
+                kova_eq_proc(&eq, static_cast<int32_t>(1.0 * 0.6 * 0.8 * 0.4 * start[i])));
+            ASSERT_EQ(buf[i], static_cast<int16_t>(sat32(s * pan[i % 2]))) << i;
+        }
     }
     kova_test::reg_files(ctx.get(), dir, {std::vector<int16_t>(400, 10000), loop, {}});
     const float xs[2] = {0.0f, 1080.0f};
@@ -269,13 +276,17 @@ TEST(GenClipTest, ReplacementValuesRotate) {
     for (int round = 0; round < 2; ++round) {
         kova_test::TempDir dir;
         kova_test::CtxPtr ctx = kova_test::make_ctx(48000, 2, 0, 0, 0);
-        const auto sound = [](int16_t v) { return std::vector<int16_t>(20, v); };
+        // Sounds long enough for the equaliser's lanes, at a level far past the 32-bit range,
+        // which the conversions must saturate on the way.
+        const auto sound = [](int16_t v) { return std::vector<int16_t>(4000, v); };
         kova_test::reg_files(ctx.get(), dir, {sound(32767), sound(0), sound(-32768)})
-            ->tune->file_gain = 1.0;
+            ->tune->file_gain = 1e6;
         kova_set_volume(ctx.get(), 10.0);
-        std::vector<int16_t> buf(20);
+        if (round == 1) kova_set_thickness(ctx.get(), 1.0);  // low band x1.2: past 32 bits too
+        std::vector<int16_t> buf(4000);
         for (int call = 0; call < 4; ++call) {
-            ASSERT_EQ(gen(ctx.get(), event(0, 0, 1, call % 2 ? KOVA_ACTION_END : 0), buf), 40);
+            ASSERT_EQ(gen(ctx.get(), event(0, 0, 1, call % 2 ? KOVA_ACTION_END : 0), buf), 8000);
+            int against = 0;  // clipped on the side the input is not on
             for (int16_t v : buf) {
                 if (v > 30000)
                     hi.take(v);
@@ -283,7 +294,9 @@ TEST(GenClipTest, ReplacementValuesRotate) {
                     lo.take(v);
                 else
                     EXPECT_LE(std::abs(v), 1);  // the equaliser's delay in a fresh context
+                against += (call % 2 ? v > 30000 : v < -30000);
             }
+            EXPECT_EQ(against, call == 0 ? 0 : 3);  // the last three of the call before
         }
     }
     EXPECT_GT(hi.seen, 60);
@@ -309,6 +322,49 @@ TEST(GenEqKernelTest, MatchesEqualiser) {
         k.store();
         ASSERT_EQ(std::memcmp(&lib, &mine, sizeof(lib)), 0);
     }
+}
+
+// The lanes a long start or end sound takes give kova_eq_proc's states bit for bit: on noise,
+// where every lane arrives at the true state, and across digital silence and a constant level,
+// where lanes can settle a few units off and their stretches must be worked again.
+TEST(GenEqKernelTest, LanesMatchEqualiser) {
+    std::mt19937 rng(3);
+    std::vector<int32_t> in(20000);
+    for (size_t i = 0; i < in.size(); ++i) {
+        const bool silent = i >= 6000 && i < 11000, level = i >= 14000 && i < 17000;
+        in[i] = silent ? 0 : level ? 5000 : static_cast<int32_t>(rng() % 20001) - 10000;
+    }
+    std::vector<double> x(in.size());
+    for (size_t i = 0; i < in.size(); ++i) x[i] = in[i] / 2147483647.0;
+    for (size_t n : {in.size(), size_t{5000}}) {
+        KOVA_EQ eq;
+        kova_eq_init(&eq, 880, 5000, 48000);
+        eq.low_state = 1e-4;
+        eq.high_state = -2e-5;
+        KOVA_EQ ref = eq;
+        std::vector<double> st(2 * n);
+        const int64_t redone =
+            kova_gen::eq_lane_states(&eq, x.data(), static_cast<int64_t>(n), st.data());
+        EXPECT_EQ(redone > 0, n == in.size());
+        for (size_t i = 0; i < n; ++i) {
+            kova_eq_proc(&ref, in[i]);
+            ASSERT_EQ(std::memcmp(&st[2 * i], &ref.low_state, sizeof(double)), 0) << i;
+            ASSERT_EQ(std::memcmp(&st[2 * i + 1], &ref.high_state, sizeof(double)), 0) << i;
+        }
+    }
+}
+
+// The divider-free normalisation gives the quotient's bits: every sample-sized value, and a
+// stride through the whole 32-bit range (two terms instead of three miss about one in 230).
+TEST(GenEqKernelTest, NormalisingWithoutTheDividerIsExact) {
+    auto exact = [](int64_t m) {
+        const double v = static_cast<double>(m), q = v / 2147483647.0;
+        const double r = kova_gen::normalised_integer(v);
+        return std::memcmp(&q, &r, sizeof q) == 0;
+    };
+    for (int64_t m = -70000; m <= 70000; ++m) ASSERT_TRUE(exact(m)) << m;
+    for (int64_t m = INT32_MIN; m <= INT32_MAX; m += 997) ASSERT_TRUE(exact(m)) << m;
+    EXPECT_TRUE(exact(INT32_MAX));
 }
 
 // Refused requests return 0 and change neither the context, the loop nor the buffer.

@@ -12,14 +12,11 @@ using namespace fake_jni;
 using jni_test::init_default;
 using jni_test::jni_lines;
 using jni_test::Lines;
-using Bytes = Array<jbyte>;
+using jni_test::reg;
 
 jint reg(jlong id, String* s, String* l, String* e) {
     auto js = [](String* p) { return p ? jstr(*p) : nullptr; };
-    return Java_com_corvane_audio_Kova_reg_1src_1byfiles(env(), nullptr, id, js(s), js(l), js(e));
-}
-jint set_src(jlong id, jint i) {
-    return Java_com_corvane_audio_Kova_set_1src(env(), nullptr, id, i);
+    return JAVA(reg_1src_1byfiles, id, js(s), js(l), js(e));
 }
 
 class Methods : public jni_test::Loaded {
@@ -27,9 +24,6 @@ class Methods : public jni_test::Loaded {
     void SetUp() override {
         Loaded::SetUp();
         ASSERT_EQ(init_default(), 1);
-        start = {files.write("start.pcm", 9600, 880)};
-        loop = {files.write("loop.pcm", 192000, 220)};
-        end = {files.write("end.pcm", 9600, 440)};
         g_got = g_released = 0;
         cap.clear();
     }
@@ -38,8 +32,8 @@ class Methods : public jni_test::Loaded {
         Loaded::TearDown();
     }
 
-    jni_test::PcmFiles files;
-    String start, loop, end;
+    jni_test::Sounds snd;
+    String &start = snd.str[0], &loop = snd.str[1], &end = snd.str[2];
     kova_test::LogCapture cap;
 };
 
@@ -49,14 +43,14 @@ TEST_F(Methods, RegistrationAndSelection) {
     EXPECT_EQ(reg(1, &start, &loop, &end), 2);
     EXPECT_EQ(g_got, 6);
     EXPECT_EQ(g_released, 6);
-    EXPECT_EQ(Java_com_corvane_audio_Kova_get_1src_1num(env(), nullptr, 1), 2);
+    EXPECT_EQ(JAVA(get_1src_1num, 1), 2);
 
-    EXPECT_EQ(set_src(1, 0), -3);  // equals the initial curSrc: no engine call
-    EXPECT_EQ(set_src(1, 1), 0);
+    EXPECT_EQ(JAVA(set_1src, 1, 0), -3);  // equals the initial curSrc: no engine call
+    EXPECT_EQ(JAVA(set_1src, 1, 1), 0);
     EXPECT_EQ(pKOVAInfo[0].pInstance->pCtx->active_src, 1);
-    EXPECT_EQ(set_src(1, 1), -3);
-    EXPECT_EQ(set_src(1, 7), -3);  // refused by the engine, yet remembered
-    EXPECT_EQ(set_src(1, 7), -3);
+    EXPECT_EQ(JAVA(set_1src, 1, 1), -3);
+    EXPECT_EQ(JAVA(set_1src, 1, 7), -3);  // refused by the engine, yet remembered
+    EXPECT_EQ(JAVA(set_1src, 1, 7), -3);
     EXPECT_EQ(jni_lines(cap),
               (Lines{"kova_reg_src () is failed. error=-4", "kova_reg_src (1, idx:1)",
                      "kova_reg_src (1, idx:2)", "kova_set_actiive_src (1, active1)",
@@ -64,19 +58,14 @@ TEST_F(Methods, RegistrationAndSelection) {
 }
 
 TEST_F(Methods, TuningThicknessAndVolumeReachTheEngine) {
-    ASSERT_EQ(reg(1, &start, &loop, &end), 1);
+    ASSERT_EQ(reg(1, snd), 1);
     cap.clear();
     KOVA_CTX* ctx = pKOVAInfo[0].pInstance->pCtx;
     auto tune = [](jint index, double gain) {
-        return Java_com_corvane_audio_Kova_set_1tuneset(env(), nullptr, 1, index, gain, 0.3, 1, 0.5,
-                                                        0, 0.2, 0.0, 0.4, 0.6, 0.9, 0.6);
+        return JAVA(set_1tuneset, 1, index, gain, 0.3, 1, 0.5, 0, 0.2, 0.0, 0.4, 0.6, 0.9, 0.6);
     };
-    auto thick = [](double v) {
-        return Java_com_corvane_audio_Kova_set_1thickness(env(), nullptr, 1, v);
-    };
-    auto vol = [](double v) {
-        return Java_com_corvane_audio_Kova_set_1volume(env(), nullptr, 1, v);
-    };
+    auto thick = [](double v) { return JAVA(set_1thickness, 1, v); };
+    auto vol = [](double v) { return JAVA(set_1volume, 1, v); };
     EXPECT_EQ(tune(1, 0.75), 0);
     KOVA_TUNE_SET t{};
     ASSERT_EQ(kova_get_tuneset(ctx, 1, &t), 0);
@@ -104,20 +93,19 @@ TEST_F(Methods, TuningThicknessAndVolumeReachTheEngine) {
 // same events directly produces the same bytes. The ring buffer is read back with the device
 // held, so it holds exactly what was written.
 TEST_F(Methods, GeneratedBlocksMatchTheEngineAndReachTheStreamWhole) {
-    ASSERT_EQ(reg(1, &start, &loop, &end), 1);
+    ASSERT_EQ(reg(1, snd), 1);
     ASSERT_EQ(init_default(), 2);
-    ASSERT_EQ(reg(2, &start, &loop, &end), 1);
+    ASSERT_EQ(reg(2, snd), 1);
     KOVA_FORMAT f{48000, 2, 1, 1080, 2280};
     int32_t err = 0;
     KOVA_CTX* ref = kova_init(&f, &err);
-    const char* paths[3] = {start.utf.c_str(), loop.utf.c_str(), end.utf.c_str()};
-    ASSERT_EQ(kova_reg_src_byfiles(ref, paths, &err), 1);
+    ASSERT_EQ(kova_reg_src_byfiles(ref, snd.path, &err), 1);
     std::vector<int16_t> ref_buf(480000);
     KOVA_PCMBUF ref_pcm{ref_buf.data(), 960000};
 
     KOVA_FASTTRACK* ft = pKOVAInfo[1].pInstance->pFastTrack;
     kova_host_hold_device(1);
-    Bytes out(960000);
+    Array<jbyte> out(960000);
     std::vector<jbyte> played;
     g_got = g_released = 0;
     jlong t = 1000;
@@ -126,17 +114,13 @@ TEST_F(Methods, GeneratedBlocksMatchTheEngineAndReachTheStreamWhole) {
         const float x = 100.0f + 9.0f * i, y = 200.0f + 4.0f * i;
         const KOVA_PARAM p{x, y, t, 0.5f, static_cast<uint32_t>(action)};
         const int32_t want = kova_gen_sounds(ref, &p, &ref_pcm);
-        ASSERT_EQ(Java_com_corvane_audio_Kova_gen_1sounds(env(), nullptr, 1, jbytes(out), x, y, t,
-                                                          0.5f, action),
-                  want);
+        ASSERT_EQ(JAVA(gen_1sounds, 1, jbytes(out), x, y, t, 0.5f, action), want);
         ASSERT_TRUE(std::equal(out.items.begin(), out.items.begin() + want,
                                reinterpret_cast<const jbyte*>(ref_buf.data())));
-        ASSERT_EQ(
-            Java_com_corvane_audio_Kova_gen_1tofasttrack(env(), nullptr, 2, x, y, t, 0.5f, action),
-            want);
+        ASSERT_EQ(JAVA(gen_1tofasttrack, 2, x, y, t, 0.5f, action), want);
         if (i == 0) {
             EXPECT_EQ(kova_ringbuffer_read_space(ft->pRing), 0u);  // stopped: nothing stored
-            Java_com_corvane_audio_Kova_start_1fasttrack(env(), nullptr, 2);
+            JAVA(start_1fasttrack, 2);
         } else {
             played.insert(played.end(), out.items.begin(), out.items.begin() + want);
         }
@@ -148,7 +132,7 @@ TEST_F(Methods, GeneratedBlocksMatchTheEngineAndReachTheStreamWhole) {
     std::vector<jbyte> ring(kova_ringbuffer_read_space(ft->pRing));
     kova_ringbuffer_read(ft->pRing, ring.data(), static_cast<uint32_t>(ring.size()));
     EXPECT_EQ(ring, played);
-    Java_com_corvane_audio_Kova_stop_1fasttrack(env(), nullptr, 2);
+    JAVA(stop_1fasttrack, 2);
     EXPECT_EQ(ft->state, 0);
     kova_deinit(ref);
 }
@@ -173,19 +157,15 @@ TEST(VolumeTables, ChecksumOfEveryTable) {
 TEST(VolumeTables, JavaArraysGetRowOneWithinTheirLength) {
     Array<jfloat> short_spk(5, -1), long_hs(20, -1), untouched(17, -1);
     g_got = g_released = 0;
-    EXPECT_EQ(Java_com_corvane_audio_Kova_get_1volumeTable(env(), nullptr, jfloats(short_spk),
-                                                           jfloats(long_hs)),
-              0);
+    EXPECT_EQ(JAVA(get_1volumeTable, jfloats(short_spk), jfloats(long_hs)), 0);
     EXPECT_TRUE(std::equal(short_spk.items.begin(), short_spk.items.end(), &spkVolume[17]));
     EXPECT_TRUE(std::equal(&headsetVolume[17], &headsetVolume[34], long_hs.items.begin()));
     EXPECT_EQ(long_hs.items[17], -1);
     EXPECT_EQ(g_got, 2);
     EXPECT_EQ(g_released, 2);
-    EXPECT_EQ(
-        Java_com_corvane_audio_Kova_get_1volumeTable(env(), nullptr, jfloats(untouched), nullptr),
-        0);
+    EXPECT_EQ(JAVA(get_1volumeTable, jfloats(untouched), nullptr), 0);
     EXPECT_EQ(untouched.items, std::vector<jfloat>(17, -1));
-    EXPECT_EQ(Java_com_corvane_audio_Kova_get_1volumeTableSize(env(), nullptr, 2), 17);
+    EXPECT_EQ(JAVA(get_1volumeTableSize, 2), 17);
 }
 
 }  // namespace

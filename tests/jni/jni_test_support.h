@@ -8,15 +8,12 @@
 
 #include <gtest/gtest.h>
 #include <jni.h>
-#include <stdlib.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <atomic>
 #include <chrono>
 #include <cmath>
-#include <filesystem>
-#include <fstream>
 #include <string>
 #include <thread>
 #include <vector>
@@ -46,26 +43,20 @@ struct Array : ArrayBase {
     std::vector<T> items;
 };
 
-template <typename T>
-std::vector<T>& items_of(jarray a) {
-    return static_cast<Array<T>*>(reinterpret_cast<ArrayBase*>(a))->items;
-}
-
 // Elements are handed out as a separate copy, as a VM may do, so only a release with mode 0
 // makes the native side's writes visible in the array.
-template <typename T>
-T* get_elements(jarray a) {
+template <typename T, typename A>
+T* get_elements(JNIEnv*, A a, jboolean*) {
     g_got++;
-    auto& items = items_of<T>(a);
+    const auto& items = static_cast<Array<T>*>(reinterpret_cast<ArrayBase*>(a))->items;
     T* copy = new T[items.size() + 1];
     std::copy(items.begin(), items.end(), copy);
     return copy;
 }
-
-template <typename T>
-void release_elements(jarray a, T* elems, jint mode) {
+template <typename T, typename A>
+void release_elements(JNIEnv*, A a, T* elems, jint mode) {
     g_released++;
-    auto& items = items_of<T>(a);
+    auto& items = static_cast<Array<T>*>(reinterpret_cast<ArrayBase*>(a))->items;
     if (mode == 0 || mode == JNI_COMMIT) std::copy(elems, elems + items.size(), items.begin());
     if (mode != JNI_COMMIT) delete[] elems;
 }
@@ -79,21 +70,13 @@ inline JNIEnv* env() {
             return reinterpret_cast<String*>(s)->utf.c_str();
         };
         t.ReleaseStringUTFChars = [](JNIEnv*, jstring, const char*) { g_released++; };
-        t.GetArrayLength = [](JNIEnv*, jarray a) -> jsize {
+        t.GetArrayLength = [](JNIEnv*, jarray a) {
             return reinterpret_cast<ArrayBase*>(a)->length;
         };
-        t.GetByteArrayElements = [](JNIEnv*, jbyteArray a, jboolean*) {
-            return get_elements<jbyte>(a);
-        };
-        t.ReleaseByteArrayElements = [](JNIEnv*, jbyteArray a, jbyte* e, jint mode) {
-            release_elements<jbyte>(a, e, mode);
-        };
-        t.GetFloatArrayElements = [](JNIEnv*, jfloatArray a, jboolean*) {
-            return get_elements<jfloat>(a);
-        };
-        t.ReleaseFloatArrayElements = [](JNIEnv*, jfloatArray a, jfloat* e, jint mode) {
-            release_elements<jfloat>(a, e, mode);
-        };
+        t.GetByteArrayElements = get_elements<jbyte, jbyteArray>;
+        t.ReleaseByteArrayElements = release_elements<jbyte, jbyteArray>;
+        t.GetFloatArrayElements = get_elements<jfloat, jfloatArray>;
+        t.ReleaseFloatArrayElements = release_elements<jfloat, jfloatArray>;
         return t;
     }();
     static JNIEnv_ e{&table};
@@ -153,13 +136,42 @@ jint Java_com_corvane_audio_Kova_get_1volumeTableSize(JNIEnv*, jclass, jint);
 jint Java_com_corvane_audio_Kova_get_1volumeTable(JNIEnv*, jclass, jfloatArray, jfloatArray);
 }
 
+// A static native method of the Java class called as the VM would, e.g. JAVA(set_1src, id, 1).
+#define JAVA(method, ...) \
+    Java_com_corvane_audio_Kova_##method(fake_jni::env(), nullptr, __VA_ARGS__)
+
 namespace jni_test {
 
 inline jlong init_default() {
-    return Java_com_corvane_audio_Kova_init(fake_jni::env(), nullptr, 48000, 2, 1, 1080, 2280);
+    return JAVA(init, 48000, 2, 1, 1080, 2280);
 }
 inline jint deinit(jlong id) {
-    return Java_com_corvane_audio_Kova_deinit(fake_jni::env(), nullptr, id);
+    return JAVA(deinit, id);
+}
+
+// Three raw 16-bit stereo PCM sounds (start, loop, end) in a folder of their own: quiet sines
+// that stay far from clipping after every gain stage; as Java strings and as C paths.
+struct Sounds {
+    explicit Sounds(size_t start = 9600, size_t loop = 192000, size_t end = 9600) {
+        const size_t bytes[3] = {start, loop, end};
+        for (int s = 0; s < 3; ++s) {
+            std::vector<int16_t> v(bytes[s] / 2);
+            for (size_t i = 0; i < v.size(); ++i) {
+                v[i] = static_cast<int16_t>(400 * std::sin(M_PI * (s + 1) * double(i / 2) / 109));
+            }
+            str[s].utf = dir.write("s" + std::to_string(s) + ".pcm", v);
+            path[s] = str[s].utf.c_str();
+        }
+    }
+    kova_test::TempDir dir;
+    fake_jni::String str[3];
+    const char* path[3];
+};
+
+// Registers the three sounds as a set of instance `id`.
+inline jint reg(jlong id, Sounds& s) {
+    using fake_jni::jstr;
+    return JAVA(reg_1src_1byfiles, id, jstr(s.str[0]), jstr(s.str[1]), jstr(s.str[2]));
 }
 
 // Lines of the Java-facing layer; every one of them must be at info priority.
@@ -172,6 +184,7 @@ inline std::vector<std::string> jni_lines(const kova_test::LogCapture& cap) {
     }
     return out;
 }
+using Lines = std::vector<std::string>;
 
 // Frees every slot and destroys the registry lock, as at load time before the load hook ran.
 inline void reset_to_unloaded() {
@@ -186,8 +199,6 @@ inline void reset_to_unloaded() {
         gpKovaMutex = nullptr;
     }
 }
-
-using Lines = std::vector<std::string>;
 
 // Waits (bounded, so a broken stream fails instead of hanging) until `done` holds.
 template <typename Pred>
@@ -213,38 +224,6 @@ class Loaded : public ::testing::Test {
         kova_mem_fail_after(-1);
         reset_to_unloaded();
     }
-};
-
-// Takes the engine context away from the instance in `slot` (freeing it).
-inline void drop_context(int slot) {
-    KovaInstance* inst = pKOVAInfo[slot].pInstance;
-    ASSERT_EQ(kova_deinit(inst->pCtx), 0);
-    inst->pCtx = nullptr;
-}
-
-// Frees a slot the teardowns cannot free (no context) together with its record.
-inline void discard(int slot) {
-    KovaInstance* inst = pKOVAInfo[slot].pInstance;
-    _KovaInfoDelbyKova(inst);
-    kova_mem_free(inst);
-}
-
-// Raw 16-bit stereo PCM: a quiet sine that stays far from clipping after every gain stage.
-class PcmFiles {
-   public:
-    std::string write(const std::string& name, size_t bytes, double hz) const {
-        std::vector<int16_t> s(bytes / 2);
-        for (size_t i = 0; i < s.size(); ++i) {
-            s[i] = static_cast<int16_t>(400 * std::sin(2 * M_PI * hz * double(i / 2) / 48000.0));
-        }
-        const std::string path = dir_.file(name);
-        std::ofstream(path, std::ios::binary)
-            .write(reinterpret_cast<const char*>(s.data()), std::streamsize(bytes));
-        return path;
-    }
-
-   private:
-    kova_test::TempDir dir_;
 };
 
 }  // namespace jni_test

@@ -18,9 +18,7 @@ namespace {
 
 using namespace jni_test;
 using namespace std::chrono_literals;
-using fake_jni::env;
 using fake_jni::jbytes;
-using fake_jni::jstr;
 
 class Registry : public Loaded {
    protected:
@@ -33,7 +31,21 @@ class Registry : public Loaded {
 using Locking = Registry;
 
 jint set_volume(jlong id) {
-    return Java_com_corvane_audio_Kova_set_1volume(env(), nullptr, id, 0.5);
+    return JAVA(set_1volume, id, 0.5);
+}
+
+// Takes the engine context away from the instance in `slot` (freeing it).
+void drop_context(int slot) {
+    KovaInstance* inst = pKOVAInfo[slot].pInstance;
+    ASSERT_EQ(kova_deinit(inst->pCtx), 0);
+    inst->pCtx = nullptr;
+}
+
+// Frees a slot the teardowns cannot free (no context) together with its record.
+void discard(int slot) {
+    KovaInstance* inst = pKOVAInfo[slot].pInstance;
+    _KovaInfoDelbyKova(inst);
+    kova_mem_free(inst);
 }
 
 // Whether `lock` is free now (it is left as it was).
@@ -43,9 +55,8 @@ bool is_free(pthread_mutex_t* lock) {
     return true;
 }
 
-TEST(RegistrySlots, IndexAddAndDelbyKova) {
-    reset_to_unloaded();
-    kova_test::LogCapture cap;
+TEST_F(Registry, IndexAddAndDelbyKova) {
+    pKOVAInfoIsInited = 0;
     pKOVAInfo[3] = KovaInfo{5, nullptr, 0};  // what static memory would not hold
     EXPECT_EQ(_KovaInfoGetIndex(), 0);       // initialises the slots first
     EXPECT_EQ(pKOVAInfo[3].pid, -1);
@@ -66,18 +77,20 @@ TEST(RegistrySlots, IndexAddAndDelbyKova) {
         EXPECT_EQ(pKOVAInfo[i].pid, want ? 10 + i : -1) << i;
     }
     _KovaInfoDelbyKova(&a);
-    reset_to_unloaded();
 }
 
-TEST_F(Registry, DelAllReportsEverySlotWithTheLastEngineResult) {
+// The unload hook sweeps every slot (with the engine result of the last teardown for slots it
+// cannot free) and leaves the registry lock alive and unlocked.
+TEST_F(Registry, UnloadReportsEverySlotWithTheLastEngineResultAndKeepsTheLock) {
     for (int i = 0; i < 4; ++i) ASSERT_EQ(init_default(), i + 1);
+    pthread_mutex_t* lock = gpKovaMutex;
     drop_context(1);                        // after a success: reports 0
     pKOVAInfo[2].pInstance->pCtx->tag = 0;  // refused
     drop_context(3);                        // after the refusal: reports -3
     cap.clear();
-    _KovaInfoDelAll();
+    JNI_OnUnload(fake_jni::vm(), nullptr);
     EXPECT_EQ(jni_lines(cap),
-              (Lines{"_KovaInfoDelAll()",
+              (Lines{"KOVA_JNI_OnUnload()", "_KovaInfoDelAll()",
                      "kova_deinit[0](pid:" + kPid + ") is finished successfully(all)",
                      "kova_deinit(pid) is failed. error=0(all)",
                      "kova_deinit[2](pid:" + kPid + ") is already completed(all)",
@@ -88,6 +101,8 @@ TEST_F(Registry, DelAllReportsEverySlotWithTheLastEngineResult) {
         EXPECT_EQ(pKOVAInfo[i].pInstance->pFastTrack, nullptr);
         EXPECT_EQ(pKOVAInfo[i].pInstance->pcm.data, nullptr);
     }
+    EXPECT_EQ(gpKovaMutex, lock);
+    EXPECT_TRUE(is_free(lock));
     pKOVAInfo[2].pInstance->pCtx->tag = KOVA_CTX_TAG;
     discard(1);
     discard(3);
@@ -156,18 +171,22 @@ TEST_F(Registry, SweepsRunWithoutALockTheyCouldNotTake) {
     EXPECT_EQ(gpKovaMutex, nullptr);
 }
 
-// A Java call queued behind the registry (it holds the gate and waits for the lock) neither blocks
-// a sweep nor has the lock released under it; it then finds its slot freed.
-TEST_F(Registry, SweepDoesNotWaitForAQueuedCall) {
+// A Java call waits for the registry lock held elsewhere (the volume tables touch no instance and
+// do not wait). Queued there (it holds the gate and waits for the lock), it neither blocks a sweep
+// nor has the lock released under it; it then finds its slot freed.
+TEST_F(Locking, QueuedCallWaitsForTheLockAndDoesNotHoldUpASweep) {
     ASSERT_EQ(init_default(), 1);
     pthread_mutex_t* lock = gpKovaMutex;
     pthread_mutex_lock(lock);
+    EXPECT_EQ(JAVA(get_1volumeTableSize, 1), 17);
     std::atomic<int> result{1};
     std::thread caller([&] { result = set_volume(1); });
     while (kova_jni::registry_gate().try_lock()) {  // until the caller holds the gate
         kova_jni::registry_gate().unlock();
         std::this_thread::yield();
     }
+    std::this_thread::sleep_for(50ms);  // time for a caller that did not wait to run ahead
+    EXPECT_EQ(result, 1);
     _KovaInfoDelAll();
     EXPECT_EQ(pKOVAInfo[0].isUsed, 0);
     EXPECT_EQ(result, 1);
@@ -176,9 +195,8 @@ TEST_F(Registry, SweepDoesNotWaitForAQueuedCall) {
     EXPECT_EQ(result, -3);
 }
 
-TEST(JniLoad, LoadHookCreatesLockAndRegistryOnceAndOnlyWithAnEnvironment) {
+TEST_F(Registry, LoadHookCreatesLockAndRegistryOnceAndOnlyWithAnEnvironment) {
     reset_to_unloaded();
-    kova_test::LogCapture cap;
     fake_jni::g_getenv_result = JNI_EDETACHED;
     EXPECT_EQ(JNI_OnLoad(fake_jni::vm(), nullptr), JNI_ERR);
     EXPECT_EQ(gpKovaMutex, nullptr);
@@ -197,20 +215,11 @@ TEST(JniLoad, LoadHookCreatesLockAndRegistryOnceAndOnlyWithAnEnvironment) {
     EXPECT_EQ(pKOVAInfo[0].pid, 77);
     EXPECT_EQ(jni_lines(cap), (Lines{"KOVA_JNI_OnLoad(init)", "KOVA_JNI_OnLoad()"}));
     _KovaInfoDelbyKova(&marker);
-    reset_to_unloaded();
 }
 
-TEST_F(Registry, DeinitOfBadIdsAndFreeSlotsKeepsTheLock) {
+// A deinit that finds an instance destroys the lock; calls without a lock do not create one.
+TEST_F(Registry, DeinitDestroysTheLockAndInitMakesAFreshOne) {
     ASSERT_EQ(init_default(), 1);
-    pthread_mutex_t* lock = gpKovaMutex;
-    cap.clear();
-    for (jlong id : {0L, -5L, 21L}) EXPECT_EQ(deinit(id), -3) << id;
-    EXPECT_EQ(deinit(2), 0);
-    EXPECT_EQ(jni_lines(cap), (Lines{"kova_deinit()", "kova_deinit()", "kova_deinit()",
-                                     "kova_deinit()", "instance is NULL. deinit() is failed."}));
-    EXPECT_EQ(gpKovaMutex, lock);
-
-    // A deinit that finds an instance destroys the lock; calls without a lock do not create one.
     EXPECT_EQ(deinit(1), 0);
     EXPECT_EQ(gpKovaMutex, nullptr);
     EXPECT_EQ(deinit(1), 0);
@@ -222,7 +231,7 @@ TEST_F(Registry, DeinitOfBadIdsAndFreeSlotsKeepsTheLock) {
 }
 
 TEST_F(Registry, FailedInitReleasesEverythingAndLeavesNoSlot) {
-    EXPECT_EQ(Java_com_corvane_audio_Kova_init(env(), nullptr, 48000, 1, 1, 1080, 2280), -1);
+    EXPECT_EQ(JAVA(init, 48000, 1, 1, 1080, 2280), -1);
     kova_host_fail_next_open(-19);
     EXPECT_EQ(init_default(), 0);
 
@@ -265,7 +274,7 @@ TEST_F(Registry, RefusedTeardownsKeepTheSlot) {
     EXPECT_EQ(inst->pcm.data, nullptr);
     EXPECT_EQ(gpKovaMutex, nullptr);
     // Without its buffer the instance generates nothing.
-    EXPECT_EQ(Java_com_corvane_audio_Kova_gen_1tofasttrack(env(), nullptr, 1, 5, 5, 0, 0, 0), 0);
+    EXPECT_EQ(JAVA(gen_1tofasttrack, 1, 5, 5, 0, 0, 0), 0);
     inst->pCtx->tag = KOVA_CTX_TAG;
     EXPECT_EQ(deinit(1), 0);
     EXPECT_EQ(pKOVAInfo[0].isUsed, 0);
@@ -284,44 +293,11 @@ TEST_F(Registry, RefusedTeardownsKeepTheSlot) {
     discard(0);
 }
 
-// The unload hook runs the teardown of every slot and leaves the lock alive and unlocked.
-TEST_F(Registry, UnloadTearsDownEveryInstanceAndKeepsTheLock) {
-    ASSERT_EQ(init_default(), 1);
-    pthread_mutex_t* lock = gpKovaMutex;
-    cap.clear();
-    JNI_OnUnload(fake_jni::vm(), nullptr);
-    EXPECT_EQ(jni_lines(cap),
-              (Lines{"KOVA_JNI_OnUnload()", "_KovaInfoDelAll()",
-                     "kova_deinit[0](pid:" + kPid + ") is finished successfully(all)"}));
-    EXPECT_EQ(pKOVAInfo[0].isUsed, 0);
-    EXPECT_EQ(gpKovaMutex, lock);
-    EXPECT_TRUE(is_free(lock));
-}
-
-// A method waits for the registry lock held elsewhere (the pause only gives a wrong
-// implementation time to run ahead); the volume tables touch no instance and do not wait.
-TEST_F(Locking, InstanceMethodsWaitForTheRegistryLock) {
-    ASSERT_EQ(init_default(), 1);
-    pthread_mutex_lock(gpKovaMutex);
-    EXPECT_EQ(Java_com_corvane_audio_Kova_get_1volumeTableSize(env(), nullptr, 1), 17);
-    std::atomic<bool> done{false};
-    std::thread caller([&] {
-        Java_com_corvane_audio_Kova_get_1src_1num(env(), nullptr, 1);
-        done = true;
-    });
-    std::this_thread::sleep_for(50ms);
-    EXPECT_FALSE(done);
-    pthread_mutex_unlock(gpKovaMutex);
-    caller.join();
-}
-
 // Owners create, use and destroy instances (each deinit destroys the registry lock) while other
 // threads call methods on arbitrary ids. Every result must be a documented one, and the
 // sanitizers must see no race and no use of a destroyed or freed mutex.
 TEST_F(Locking, DeinitDestroyingTheLockStrandsNoCaller) {
-    PcmFiles files;
-    fake_jni::String loop{files.write("loop.pcm", 38400, 220)};
-    fake_jni::String start{files.write("start.pcm", 4800, 880)};
+    Sounds snd(4800, 38400, 4800);
     std::atomic<int> owners_left{3}, bad{0};
     auto expect_in = [&](int v, std::initializer_list<int> allowed) {
         if (std::find(allowed.begin(), allowed.end(), v) == allowed.end()) bad++;
@@ -333,21 +309,17 @@ TEST_F(Locking, DeinitDestroyingTheLockStrandsNoCaller) {
             for (int r = 0; r < 25; ++r) {
                 const jlong id = init_default();
                 expect_in(id >= 1 && id <= 20, {1});
-                expect_in(Java_com_corvane_audio_Kova_reg_1src_1byfiles(
-                              env(), nullptr, id, jstr(start), jstr(loop), nullptr),
-                          {1});
-                expect_in(Java_com_corvane_audio_Kova_set_1src(env(), nullptr, id, 1), {0});
-                Java_com_corvane_audio_Kova_start_1fasttrack(env(), nullptr, id);
+                expect_in(reg(id, snd), {1});
+                expect_in(JAVA(set_1src, id, 1), {0});
+                JAVA(start_1fasttrack, id);
                 for (int e = 0; e < 6; ++e) {
                     const int action = e == 0 ? 0 : e == 5 ? 2 : 1;
                     const float x = 10.f + 5 * e;
-                    Java_com_corvane_audio_Kova_gen_1tofasttrack(env(), nullptr, id, x, 10.f,
-                                                                 100 + 10 * e, 0, action);
-                    Java_com_corvane_audio_Kova_gen_1sounds(env(), nullptr, id, jbytes(out), x,
-                                                            10.f, 100 + 10 * e, 0, action);
+                    JAVA(gen_1tofasttrack, id, x, 10.f, 100 + 10 * e, 0, action);
+                    JAVA(gen_1sounds, id, jbytes(out), x, 10.f, 100 + 10 * e, 0, action);
                 }
                 expect_in(set_volume(id), {0});
-                Java_com_corvane_audio_Kova_stop_1fasttrack(env(), nullptr, id);
+                JAVA(stop_1fasttrack, id);
                 expect_in(deinit(id), {0});
             }
             owners_left--;
@@ -359,12 +331,11 @@ TEST_F(Locking, DeinitDestroyingTheLockStrandsNoCaller) {
             fake_jni::Array<jbyte> out(4096);
             while (owners_left > 0) {
                 const jlong id = static_cast<jlong>(rng() % 23) - 1;  // -1 .. 21
-                expect_in(Java_com_corvane_audio_Kova_get_1src_1num(env(), nullptr, id), {0, 1});
+                expect_in(JAVA(get_1src_1num, id), {0, 1});
                 expect_in(set_volume(id), {0, -3});
-                const int n = Java_com_corvane_audio_Kova_gen_1sounds(
-                    env(), nullptr, id, jbytes(out), 20, 20, 50, 0, 0);
+                const int n = JAVA(gen_1sounds, id, jbytes(out), 20, 20, 50, 0, 0);
                 expect_in(n >= 0 && n <= 4096, {1});
-                Java_com_corvane_audio_Kova_stop_1fasttrack(env(), nullptr, id);
+                JAVA(stop_1fasttrack, id);
             }
         });
     }
@@ -382,13 +353,13 @@ TEST_F(Locking, DeinitOfAStalledInstanceDoesNotHoldUpOthers) {
     ASSERT_EQ(init_default(), 1);
     kova_host_use_null_sink();
     ASSERT_EQ(init_default(), 2);
-    Java_com_corvane_audio_Kova_start_1fasttrack(env(), nullptr, 1);
+    JAVA(start_1fasttrack, 1);
     std::this_thread::sleep_for(50ms);  // the device thread is now inside its first write
 
     std::thread owner([&] { EXPECT_EQ(deinit(1), 0); });
     std::this_thread::sleep_for(20ms);  // let deinit take the registry lock
     const auto t0 = std::chrono::steady_clock::now();
-    EXPECT_EQ(Java_com_corvane_audio_Kova_get_1src_1num(env(), nullptr, 2), 0);
+    EXPECT_EQ(JAVA(get_1src_1num, 2), 0);
     EXPECT_LT(std::chrono::steady_clock::now() - t0, 1500ms);
     owner.join();
     EXPECT_EQ(deinit(2), 0);

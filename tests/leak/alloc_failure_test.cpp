@@ -8,7 +8,7 @@
 #include <malloc.h>
 
 #include <atomic>
-#include <cerrno>
+#include <algorithm>
 #include <functional>
 #include <string>
 #include <thread>
@@ -40,7 +40,6 @@ extern "C" {
 void* __libc_malloc(size_t);
 void* __libc_calloc(size_t, size_t);
 void* __libc_realloc(void*, size_t);
-void* __libc_memalign(size_t, size_t);
 void __libc_free(void*);
 }
 
@@ -68,30 +67,18 @@ void* realloc(void* p, size_t n) {
     if (q != nullptr || n == 0) g_live_bytes -= old;  // moved, resized or freed
     return counted(q);
 }
-void* memalign(size_t align, size_t n) {
-    return counted(__libc_memalign(align, n));
-}
-void* aligned_alloc(size_t align, size_t n) {
-    return counted(__libc_memalign(align, n));
-}
-int posix_memalign(void** out, size_t align, size_t n) {
-    void* p = counted(__libc_memalign(align, n));
-    if (p == nullptr) return ENOMEM;
-    *out = p;
-    return 0;
-}
 }
 #endif
 
 namespace {
 
 using namespace std::chrono_literals;
+constexpr int kMem = KOVA_ERR_INSUFF_MEM;
 const KOVA_FORMAT kPhone{48000, 2, 1, 1080, 2280};
 const KOVA_FLT_DSC kLowpass{KOVA_FLT_LOWPASS, 2000.0, 1.0, 1, 48000, 2};
 const KOVA_FLT_DSC kBandpass{KOVA_FLT_BANDPASS, 1200.0, 0.7, 1, 48000, 2};
-const std::initializer_list<int> kMemOrParam = {KOVA_ERR_INSUFF_MEM, KOVA_ERR_INVALID_PARAM};
-const std::initializer_list<int> kAnyError = {KOVA_ERR_INSUFF_MEM, KOVA_ERR_SOURCE,
-                                              KOVA_ERR_INVALID_PARAM};
+const std::vector<int> kMemOrParam = {kMem, KOVA_ERR_INVALID_PARAM};
+const std::vector<int> kAnyError = {kMem, KOVA_ERR_SOURCE, KOVA_ERR_INVALID_PARAM};
 
 // One allocating operation, run with allocation n failing by `attempt(n)`, which checks that the
 // result is success or a documented failure, that what existed is intact, and undoes its own
@@ -151,29 +138,33 @@ void sweep(const Op& op) {
 }
 
 // Whether `v` is one of the documented failure `codes`; anything else fails the test.
-bool one_of(int v, std::initializer_list<int> codes) {
-    for (int c : codes) {
-        if (v == c) return true;
-    }
+bool one_of(int v, const std::vector<int>& codes) {
+    if (std::find(codes.begin(), codes.end(), v) != codes.end()) return true;
     ADD_FAILURE() << "undocumented result " << v;
     return false;
 }
 
-// A constructor's result: released when it was made (false), else whether `err` (read after the
-// constructor ran) holds a documented code.
-template <typename T, typename Release>
-bool made_or(T* made, Release release, const int32_t& err, std::initializer_list<int> codes) {
-    if (made != nullptr) return release(made) != KOVA_OK;
-    return one_of(err, codes);
+// A constructor run with allocation n failing: what it made releases cleanly; when it made
+// nothing, it failed, with one of `codes` in `*err` (read afterwards) where it reports one.
+template <typename Make, typename Release>
+std::function<bool(long)> made(Make make, Release release, const int32_t* err = nullptr,
+                               std::vector<int> codes = {}) {
+    return [=](long n) {
+        auto* p = failing_at(n, make);
+        if (p == nullptr) return err == nullptr || one_of(*err, codes);
+        if constexpr (std::is_void_v<decltype(release(p))>) {
+            release(p);
+        } else {
+            EXPECT_EQ(release(p), KOVA_OK);
+        }
+        return false;
+    };
 }
 
 class AllocFailure : public testing::Test {
    protected:
     void SetUp() override {
-        start_ = files_.write("start.pcm", 4000, 700.0);
-        loop_ = files_.write("loop.pcm", 20000, 300.0);
-        end_ = files_.write("end.pcm", 3000, 500.0);
-        saved_ = start_ + ".kss";
+        saved_ = snd_.dir.file("set.kss");
         // A set with two filters and all three slots, saved once as the file to read back.
         KOVA_CTX* ctx = engine_with_set();
         ASSERT_NE(ctx, nullptr);
@@ -186,8 +177,7 @@ class AllocFailure : public testing::Test {
     KOVA_CTX* engine_with_set() {
         int32_t err = 0;
         KOVA_CTX* ctx = kova_init(&kPhone, &err);
-        const char* paths[3] = {start_.c_str(), loop_.c_str(), end_.c_str()};
-        if (ctx != nullptr && (kova_reg_src_byfiles(ctx, paths, &err) != 1 ||
+        if (ctx != nullptr && (kova_reg_src_byfiles(ctx, snd_.path, &err) != 1 ||
                                kova_attach_filter(ctx, 1, &kLowpass, &err) != 1 ||
                                kova_attach_filter(ctx, 1, &kBandpass, &err) != 1)) {
             kova_deinit(ctx);
@@ -215,31 +205,17 @@ class AllocFailure : public testing::Test {
         return failed;
     }
 
-    // A Java instance's whole life: registration, a start event played, teardown.
-    void java_instance(jlong id) {
-        JNIEnv* env = fake_jni::env();
-        EXPECT_EQ(Java_com_corvane_audio_Kova_reg_1src_1byfiles(
-                      env, nullptr, id, fake_jni::jstr(s_[0]), fake_jni::jstr(s_[1]),
-                      fake_jni::jstr(s_[2])),
-                  1);
-        Java_com_corvane_audio_Kova_start_1fasttrack(env, nullptr, id);
-        EXPECT_EQ(Java_com_corvane_audio_Kova_gen_1tofasttrack(env, nullptr, id, 10, 10, 5, 0, 0),
-                  4000);
-    }
-
-    jni_test::PcmFiles files_;
-    std::string start_, loop_, end_, saved_;
-    fake_jni::String s_[3];
+    jni_test::Sounds snd_{4000, 20000, 3000};
+    std::string saved_;
 };
 
 TEST_F(AllocFailure, EveryOperationReportsReleasesAndKeepsWhatExisted) {
-    const char* paths[3] = {start_.c_str(), loop_.c_str(), end_.c_str()};
+    const char* const* paths = snd_.path;
     int32_t err = 0;
     const std::string out = saved_ + ".out";
     const KOVA_FLT_DSC highpass{KOVA_FLT_HIGHPASS, 150.0, 1.0, 1, 48000, 2};
     KOVA_FLT_DSC narrower = kBandpass;
     narrower.bandwidth = 0.3;
-    s_[0].utf = start_, s_[1].utf = loop_, s_[2].utf = end_;
     // A registration on a context that already plays a set: set 2, or a failure that adds nothing.
     auto reg = [&](auto call) {
         return [&, call](long n) {
@@ -259,11 +235,7 @@ TEST_F(AllocFailure, EveryOperationReportsReleasesAndKeepsWhatExisted) {
         };
     };
     const Op ops[] = {
-        {"kova_init",
-         [&](long n) {
-             return made_or(failing_at(n, [&] { return kova_init(&kPhone, &err); }), kova_deinit,
-                            err, {KOVA_ERR_INSUFF_MEM});
-         },
+        {"kova_init", made([&] { return kova_init(&kPhone, &err); }, kova_deinit, &err, {kMem}),
          "KOVA_CTX malloc fail \nkova_init() fail. err code (-2) \n", 8},
         {"register files", reg([&](KOVA_CTX* c) { return kova_reg_src_byfiles(c, paths, &err); })},
         {"register filter",
@@ -286,21 +258,17 @@ TEST_F(AllocFailure, EveryOperationReportsReleasesAndKeepsWhatExisted) {
                  return rc <= 0 && one_of(rc, {KOVA_ERR_SOURCE, KOVA_ERR_INVALID_PARAM});
              });
          }},
-        {"load sound source",
-         [&](long n) {
-             return made_or(
-                 failing_at(n, [&] { return kova_load_sound_source(loop_.c_str(), 1, &err); }),
-                 [](KOVA_SRC* src) {
-                     EXPECT_EQ(src->size, 20000);
-                     return kova_free_sourceobj(src), KOVA_OK;
-                 },
-                 err, {KOVA_ERR_INSUFF_MEM, KOVA_ERR_SOURCE});
-         }},
+        {"load sound source", made([&] { return kova_load_sound_source(paths[1], 1, &err); },
+                                   [](KOVA_SRC* src) {
+                                       EXPECT_EQ(src->size, 20000);
+                                       kova_free_sourceobj(src);
+                                   },
+                                   &err, {kMem, KOVA_ERR_SOURCE})},
         {"read source file",
          [&](long n) {
              char buf[64];
              const int got =
-                 failing_at(n, [&] { return kova_read_source_file(end_.c_str(), buf, 64); });
+                 failing_at(n, [&] { return kova_read_source_file(paths[2], buf, 64); });
              return got != 64 && one_of(got, {0});
          }},
         {"open saved set",
@@ -333,36 +301,20 @@ TEST_F(AllocFailure, EveryOperationReportsReleasesAndKeepsWhatExisted) {
              return failed;
          }},
         {"filter",
-         [&](long n) {
-             return made_or(failing_at(n, [&] { return kova_flt_init(&kBandpass, &err); }),
-                            kova_flt_deinit, err, {KOVA_ERR_INSUFF_MEM});
-         },
+         made([&] { return kova_flt_init(&kBandpass, &err); }, kova_flt_deinit, &err, {kMem}),
          "KOVA_CTX malloc fail \nkova_flt_init() fail. err code (-2) \n", 7},
-        {"oscillator",
-         [&](long n) {
-             KOVA_OSC* osc = failing_at(n, [&] { return kova_osc_init(48000, 2, 0); });
-             return osc == nullptr || kova_osc_deinit(osc) != KOVA_OK;
-         },
+        {"oscillator", made([] { return kova_osc_init(48000, 2, 0); }, kova_osc_deinit),
          "KOVA_CTX malloc fail \nkova_osc_init() fail. err code (KOVA_ERR_INSUFF_MEM) \n"},
         {"noise source",
-         [&](long n) {
-             return made_or(
-                 failing_at(n, [&] { return kova_gen_sound_source_wn(&kLowpass, 1, &err); }),
-                 [](KOVA_SRC* src) { return kova_free_sourceobj(src), KOVA_OK; }, err,
-                 {KOVA_ERR_INSUFF_MEM});
-         },
+         made([&] { return kova_gen_sound_source_wn(&kLowpass, 1, &err); }, kova_free_sourceobj,
+              &err, {kMem}),
          "kova_gen_sound_source() fail.", 3},
-        {"ring buffer",
-         [&](long n) {
-             KOVA_RINGBUFFER* rb = failing_at(n, [] { return kova_ringbuffer_create(64); });
-             kova_ringbuffer_free(rb);
-             return rb == nullptr;
-         },
-         "", 2},
+        {"ring buffer", made([] { return kova_ringbuffer_create(64); }, kova_ringbuffer_free), "",
+         2},
         {"file access",
          [&](long n) {
              TARQ_MFAL m{};
-             if (failing_at(n, [&] { return tarq_mfal_init(end_.c_str(), &m); }) != 0) return true;
+             if (failing_at(n, [&] { return tarq_mfal_init(paths[2], &m); }) != 0) return true;
              kova_mem_free(m.path);
              return false;
          }},
@@ -381,18 +333,17 @@ TEST_F(AllocFailure, EveryOperationReportsReleasesAndKeepsWhatExisted) {
          },
          "", 3},
         {"fast-track stream",
-         [&](long n) {
-             KOVA_FASTTRACK* ft = failing_at(n, [] { return kova_open_fasttrack(48000, 2); });
-             kova_close_fasttrack(ft, 1);
-             return ft == nullptr;
-         },
+         made([] { return kova_open_fasttrack(48000, 2); },
+              [](KOVA_FASTTRACK* ft) { kova_close_fasttrack(ft, 1); }),
          "", 4},
         {"Java instance",
          [&](long n) {
              const jlong id = failing_at(n, [&] { return jni_test::init_default(); });
-             if (id >= 1) {
-                 java_instance(id);
-                 EXPECT_EQ(jni_test::deinit(id), 0);
+             if (id >= 1) {  // its whole life: a set registered, a start sound played, teardown
+                 EXPECT_EQ(jni_test::reg(id, snd_), 1);
+                 JAVA(start_1fasttrack, id);
+                 EXPECT_EQ(JAVA(gen_1tofasttrack, id, 10, 10, 5, 0, 0), 4000);
+                 EXPECT_EQ(jni_test::deinit(id), 0);  // while playing
              }
              for (const KovaInfo& slot : pKOVAInfo) EXPECT_EQ(slot.isUsed, 0);
              // A deinit takes the registry lock with it; the load hook brings it back so every
@@ -403,33 +354,6 @@ TEST_F(AllocFailure, EveryOperationReportsReleasesAndKeepsWhatExisted) {
          "", 3},
     };
     for (const Op& op : ops) sweep(op);
-}
-
-// Many whole lifecycles in a row: whatever one leaves behind adds up.
-TEST_F(AllocFailure, RepeatedLifecyclesGiveEverythingBack) {
-    JNIEnv* env = fake_jni::env();
-    s_[0].utf = start_, s_[1].utf = loop_, s_[2].utf = end_;
-    auto cycle = [&] {
-        const jlong a = Java_com_corvane_audio_Kova_init(env, nullptr, 48000, 2, 1, 1080, 2280);
-        const jlong b = Java_com_corvane_audio_Kova_init(env, nullptr, 16000, 1, 0, 720, 1280);
-        ASSERT_GE(a, 1);
-        ASSERT_GE(b, 1);
-        java_instance(a);
-        java_instance(b);
-        KOVA_CTX* ctx = engine_with_set();
-        ASSERT_NE(ctx, nullptr);
-        int32_t err = 0;
-        EXPECT_EQ(kova_reg_src_bysavefile(ctx, saved_.c_str(), &err), 2);
-        EXPECT_EQ(kova_deinit(ctx), KOVA_OK);
-        EXPECT_EQ(Java_com_corvane_audio_Kova_deinit(env, nullptr, b), 0);  // still playing
-        EXPECT_EQ(Java_com_corvane_audio_Kova_deinit(env, nullptr, a), 0);
-    };
-    cycle();  // warm-up
-    EXPECT_TRUE(jni_test::wait_for([] { return kova_host_lingering_tracks() == 0; }));
-    const long long heap = g_live_bytes.load();
-    for (int i = 0; i < 30; ++i) cycle();
-    settle(heap);
-    EXPECT_EQ(g_live_bytes.load(), heap);
 }
 
 }  // namespace

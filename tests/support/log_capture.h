@@ -37,14 +37,6 @@ class LogCapture {
         std::lock_guard<std::mutex> guard(lock_);
         return lines_;
     }
-    // Messages of one tag, in order.
-    std::vector<std::string> messages(const std::string& tag) const {
-        std::vector<std::string> out;
-        for (const LogLine& line : lines()) {
-            if (line.tag == tag) out.push_back(line.message);
-        }
-        return out;
-    }
     void clear() {
         std::lock_guard<std::mutex> guard(lock_);
         lines_.clear();

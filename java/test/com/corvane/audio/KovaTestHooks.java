@@ -22,11 +22,6 @@ final class KovaTestHooks {
 
     private KovaTestHooks() {}
 
-    // Log lines written since the previous call.
-    static List<String> logs() {
-        return List.of(takeLogLines());
-    }
-
     static native void useCaptureSink();
 
     static native void useNullSink();
