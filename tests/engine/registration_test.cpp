@@ -127,9 +127,7 @@ TEST(Registration, LoopPathDecidesWhetherASetExists) {
     EXPECT_EQ(set->src[KOVA_SLOT_END], nullptr);
     ASSERT_EQ(set->src[KOVA_SLOT_LOOP]->size, 8000);
     EXPECT_EQ(0, memcmp(set->src[KOVA_SLOT_LOOP]->pcm, set->src[KOVA_SLOT_LOOP]->pcm_proc, 8000));
-    std::vector<int16_t> buf(48000);
-    EXPECT_EQ(kova_test::gen(e.get(), kova_test::event(10, 10, 5, KOVA_ACTION_START), buf), 0);
-    EXPECT_EQ(kova_test::gen(e.get(), kova_test::event(10, 10, 9, KOVA_ACTION_END), buf), 0);
+    // That empty start and end slots play nothing is GenTest.StartAndEndSlots.
 }
 
 /* Identifiers count up from 1 over all three ways of registering, the newest set becomes the
