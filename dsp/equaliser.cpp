@@ -8,11 +8,10 @@
 
 namespace {
 
+using kova::dsp::kEqStateBias;
 using kova::dsp::kPi;
 
 constexpr double kFullScale = 2147483647.0;
-/* 1 / 4294967295, added to both sections on every step. */
-constexpr double kStateBias = 2.3283064370807974e-10;
 /* The double just above 0.3 (0x3FD3333333333334); the slew factor is defined with it. */
 constexpr double kSlewSlope = 0.30000000000000004;
 constexpr double kInitialSlewDecay = 0.88;
@@ -59,8 +58,8 @@ int32_t kova_eq_proc(KOVA_EQ* eq, int32_t sample) {
      * rather than crashing. */
     if (eq == nullptr) return sample;
     const double x = static_cast<double>(sample) / kFullScale;
-    eq->low_state = eq->low_state + (eq->low_coef * (x - eq->low_state) + kStateBias);
-    eq->high_state = eq->high_state + (eq->high_coef * (x - eq->high_state) + kStateBias);
+    eq->low_state = eq->low_state + (eq->low_coef * (x - eq->low_state) + kEqStateBias);
+    eq->high_state = eq->high_state + (eq->high_coef * (x - eq->high_state) + kEqStateBias);
 
     /* The bands are taken against the input of three calls ago. */
     const double delayed = eq->hist[2];

@@ -10,6 +10,9 @@
 namespace kova::dsp {
 
 inline constexpr double kPi = 3.141592653589793;
+/* The equaliser's constant, 1 / 4294967295, added to both of its sections on every step (the
+ * equaliser itself and the generator's copies of its step). */
+inline constexpr double kEqStateBias = 2.3283064370807974e-10;
 inline constexpr double kTwoPi = 6.283185307179586;
 
 /* Truncates toward zero to 32 bits, saturating at the limits. NaN gives 0: a plain cast would be

@@ -58,8 +58,8 @@ int64_t eq_lane_min_run() {
 }
 
 int64_t eq_lane_states(const KOVA_EQ* eq, const double* x, int64_t n, double* st) {
-    constexpr double kStateBias = 2.3283064370807974e-10;
-    const Sections sec{{eq->low_coef, eq->high_coef}, {kStateBias, kStateBias}};
+    constexpr double kBias = kova::dsp::kEqStateBias;
+    const Sections sec{{eq->low_coef, eq->high_coef}, {kBias, kBias}};
     const v2d start = {eq->low_state, eq->high_state};
     const int64_t len = n / kLanes;  // stretch per lane; the last few samples follow serially
     if (len < kWarmup) {

@@ -74,9 +74,8 @@ class EqKernel {
      * 1.0 changes no bit, and one multiply less per sample shows in the generator's loop. */
     template <bool kUnitMid = false>
     int32_t proc_input(double x) {
-        constexpr double kStateBias = 2.3283064370807974e-10;
-        low_state_ = low_state_ + (low_coef_ * (x - low_state_) + kStateBias);
-        high_state_ = high_state_ + (high_coef_ * (x - high_state_) + kStateBias);
+        low_state_ = low_state_ + (low_coef_ * (x - low_state_) + kova::dsp::kEqStateBias);
+        high_state_ = high_state_ + (high_coef_ * (x - high_state_) + kova::dsp::kEqStateBias);
         const double delayed = h2_;
         const double low = low_state_;
         const double high = delayed - high_state_;
