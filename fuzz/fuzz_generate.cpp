@@ -26,7 +26,6 @@
 #include <string>
 
 #include "fuzz_support.h"
-#include "set_cache.h"
 
 using namespace kova_fuzz;
 
@@ -88,8 +87,7 @@ KOVA_FLT_DSC read_filter(Bytes& in, const KOVA_FORMAT& f) {
 }
 
 // The three PCM files of a file source. Their content follows from the lengths and amplitude
-// an input gives; they are written only when the library is about to read them (a registration
-// the cache does not serve, a filter change that reloads them) and differ from what is on disk.
+// an input gives; they are written only when they differ from what is on disk.
 struct PcmFiles {
     const ScratchFile files[KOVA_SLOT_COUNT] = {ScratchFile("gen-start"), ScratchFile("gen-loop"),
                                                 ScratchFile("gen-end")};
@@ -112,24 +110,6 @@ struct PcmFiles {
 };
 
 PcmFiles g_pcm_files;
-SetCache g_kept_sets;
-
-// Registers a set: the kept one for `key` when there is one, else `make()` (the library's
-// registration, or -1 when it is skipped), whose set is then kept. Not instrumented: which way
-// it went is the cache's business, not behaviour of the library.
-template <typename Make>
-__attribute__((no_sanitize("coverage"))) int32_t register_kept(KOVA_CTX* ctx,
-                                                               const std::string& key, Make make) {
-    int32_t id = g_kept_sets.reuse(ctx, key);
-    if (id != 0) return id;
-    id = make();
-    g_kept_sets.keep(ctx, id, key);
-    return id;
-}
-
-std::string noise_key(const KOVA_FORMAT& f, const KOVA_FLT_DSC& d) {
-    return "noise" + key_bytes(f) + key_bytes(d);
-}
 
 class Session {
    public:
@@ -214,11 +194,8 @@ class Session {
             }
             case kRegFilter: {
                 const KOVA_FLT_DSC d = read_filter(in, format_);
-                // A kept set costs nothing; only a registration by the library counts.
-                const int32_t id = register_kept(ctx_, noise_key(format_, d), [&] {
-                    return costly() ? kova_reg_src_byfilter(ctx_, &d, &err) : -1;
-                });
-                if (id < 0) break;
+                if (!costly()) break;
+                const int32_t id = kova_reg_src_byfilter(ctx_, &d, &err);
                 FUZZ_CHECK(id == 0 ? kova_get_src_num(ctx_) == count : id == count + 1);
                 break;
             }
@@ -227,7 +204,6 @@ class Session {
                 const KOVA_FLT_DSC d = read_filter(in, format_);
                 if (!costly()) break;
                 g_pcm_files.sync();  // a file set reads its files again
-                g_kept_sets.edited();
                 (op == kAttach ? kova_attach_filter : kova_update_filter)(ctx_, count, &d, &err);
                 break;
             }
@@ -252,7 +228,7 @@ class Session {
         }
     }
 
-    // Registering a noise source the cache does not hold, filtering a set again or saving and
+    // Registering a noise source, filtering a set again or saving and
     // reading it back works through up to 270 KB of samples (about a millisecond here, several
     // times a cheap input): two per input (a noise source made for the first set counts),
     // further ones are skipped, so such inputs cannot dominate the run. Their order with
@@ -271,19 +247,16 @@ class Session {
     Stroke stroke_ = Stroke::kClosed;
 };
 
-void register_files(Bytes& in, KOVA_CTX* ctx, const KOVA_FORMAT& f) {
+void register_files(Bytes& in, KOVA_CTX* ctx) {
     // start, loop (in units of 4 bytes), end; a braced list reads them in this order
     const size_t lengths[KOVA_SLOT_COUNT] = {in.take<uint16_t>(), in.take<uint16_t>() * size_t{4},
                                              in.take<uint16_t>()};
     const uint8_t amplitude = in.take<uint8_t>();
     std::memcpy(g_pcm_files.wanted, lengths, sizeof lengths);
     g_pcm_files.amplitude = amplitude;
-    const std::string key = "files" + key_bytes(f) + key_bytes(lengths) + key_bytes(amplitude);
-    const int32_t id = register_kept(ctx, key, [&] {
-        g_pcm_files.sync();
-        int32_t err = 0;
-        return kova_reg_src_byfiles(ctx, g_pcm_files.paths, &err);
-    });
+    g_pcm_files.sync();
+    int32_t err = 0;
+    const int32_t id = kova_reg_src_byfiles(ctx, g_pcm_files.paths, &err);
     FUZZ_CHECK((id == 1) == (lengths[KOVA_SLOT_LOOP] > 0));
 }
 
@@ -303,27 +276,18 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
         FUZZ_CHECK(kova_checkformat(&f) < 1 && engine.init_error() == KOVA_ERR_INVALID_FORMAT);
         return 0;
     }
-    // The kept sets leave the context before it is reset (locals end in reverse order).
-    struct Release {
-        KOVA_CTX* ctx;
-        ~Release() { g_kept_sets.release(ctx); }
-    } const release{ctx};
     int32_t err = 0;
 
     // 0, 1, 2 as above; any other value means files (a noise source costs about a
     // millisecond to make, so random kinds must not turn most inputs into filter inputs).
     const uint8_t kind = in.take<uint8_t>();
-    if (kind != kSourceFilter) register_files(in, ctx, f);
-    bool made_noise = false;
+    if (kind != kSourceFilter) register_files(in, ctx);
     if (kind == kSourceFilter || kind == kSourceBoth) {
         const KOVA_FLT_DSC d = read_filter(in, f);
-        register_kept(ctx, noise_key(f, d), [&] {
-            made_noise = true;
-            return kova_reg_src_byfilter(ctx, &d, &err);
-        });
+        kova_reg_src_byfilter(ctx, &d, &err);
     }
     Session session(ctx, f);
-    if (made_noise) session.costly();
+    if (kind == kSourceFilter || kind == kSourceBoth) session.costly();
     while (!in.empty()) {
         const uint8_t op = in.take<uint8_t>() % kOpCount;
         if (op < kOpTune) {
