@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // Motion events, tune sets, thickness and volume values and set management decoded from the
-// input and run through kova_gen_sounds with output buffers of every size. One engine context
-// serves every input of the same format (reset in between).
+// input and run through kova_gen_sounds with output buffers of every size.
 //
 // Input layout (all values in machine byte order):
 //   header   u8 format flags (kFmt*), u16 w, u16 h, [raw: u32 rate, u32 channels, u32 p]
@@ -270,7 +269,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
                   (flags & kFmtPan) ? 1u : 0u, in.take<uint16_t>(), in.take<uint16_t>()};
     if (flags & kFmtRaw)
         f = {in.take<uint32_t>(), in.take<uint32_t>(), in.take<uint32_t>(), f.w, f.h};
-    const ReusedCtx engine(f);
+    const ScopedCtx engine(f);
     KOVA_CTX* ctx = engine.get();
     if (ctx == nullptr) {
         FUZZ_CHECK(kova_checkformat(&f) < 1 && engine.init_error() == KOVA_ERR_INVALID_FORMAT);

@@ -96,7 +96,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
         check_load(files[slot], c.data(), c.size());
     }
 
-    const ReusedCtx engine(kPhoneFormat);
+    const ScopedCtx engine(kPhoneFormat);
     KOVA_CTX* ctx = engine.get();
     FUZZ_CHECK(ctx != nullptr);
     int32_t err = 0;

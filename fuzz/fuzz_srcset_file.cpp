@@ -2,7 +2,7 @@
 // An arbitrary source-set file (the input in the chunk language of file_script.h) through the four
 // engine-less queries, then registered as a source set, played with a short stroke, saved and
 // registered again; then the filter query and the registration again with an allocation failure
-// injected somewhere along the way. One engine context serves every input (reset in between).
+// injected somewhere along the way.
 //
 // Properties: no crash, leak or undefined behaviour; every query on an existing file answers 0
 // (or -2 when memory runs out); outputs of absent items stay as the caller set them; the tune set
@@ -157,7 +157,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     check_filters(input.path());
     check_rptinfo(input.path());
     {
-        const ReusedCtx engine(kPhoneFormat);
+        const ScopedCtx engine(kPhoneFormat);
         FUZZ_CHECK(engine.get() != nullptr);
         if (registered(engine.get(), input.path())) play_and_resave(engine.get(), saved, resaved);
     }
@@ -170,7 +170,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
         const int rc = kova_get_filters_fromfile(input.path(), flt);
         kova_mem_fail_after(-1);
         FUZZ_CHECK(rc == KOVA_OK || rc == KOVA_ERR_INVALID_PARAM || rc == KOVA_ERR_INSUFF_MEM);
-        const ReusedCtx engine(kPhoneFormat);
+        const ScopedCtx engine(kPhoneFormat);
         kova_mem_fail_after(static_cast<long>(data[size - 1] % 16));
         const bool ok = registered(engine.get(), input.path());
         kova_mem_fail_after(-1);

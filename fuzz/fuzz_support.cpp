@@ -11,7 +11,6 @@
 #include <fstream>
 #include <iterator>
 
-#include "kova/kova_list.h"
 #include "util/kova_mem.h"
 
 namespace kova_fuzz {
@@ -71,11 +70,6 @@ constexpr uint8_t kGuardByte = 0xA5;
 // 8-byte aligned, so the guard after a buffer of even size starts on a shadow granule.
 alignas(16) uint8_t g_arena[kMaxPcmBytes + 64];
 
-template <typename T>
-bool same_bytes(const T& a, const T& b) {
-    return std::memcmp(&a, &b, sizeof(T)) == 0;
-}
-
 }  // namespace
 
 int32_t checked_gen(KOVA_CTX* ctx, const KOVA_PARAM& ev, int32_t buffer_bytes) {
@@ -122,54 +116,6 @@ bool same_tune(const KOVA_TUNE_SET& a, const KOVA_TUNE_SET& b) {
            f(a.sharpness, b.sharpness) && f(a.wn_gain, b.wn_gain) && f(a.file_gain, b.file_gain) &&
            f(a.start_gain, b.start_gain) && f(a.loop_gain, b.loop_gain) &&
            f(a.end_gain, b.end_gain);
-}
-
-namespace {
-
-// The context kept across inputs and the images of its parts right after kova_init.
-struct Kept {
-    KOVA_CTX* ctx = nullptr;
-    KOVA_FORMAT format{};
-    KOVA_CTX fields{};
-    KOVA_PARAM prev{};
-    KOVA_OSC osc{};
-    KOVA_EQ eq{};
-};
-
-Kept& kept() {
-    static Kept k;
-    return k;
-}
-
-}  // namespace
-
-ReusedCtx::ReusedCtx(const KOVA_FORMAT& f) {
-    Kept& k = kept();
-    if (k.ctx != nullptr && same_bytes(k.format, f)) {
-        ctx_ = k.ctx;
-        return;
-    }
-    if (k.ctx != nullptr) FUZZ_CHECK(kova_deinit(k.ctx) == KOVA_OK);
-    k.format = f;
-    k.ctx = kova_init(&k.format, &err_);
-    if (k.ctx == nullptr) return;
-    k.fields = *k.ctx;
-    k.prev = *k.ctx->prev_param;
-    k.osc = *k.ctx->osc;
-    k.eq = *k.ctx->eq;
-    ctx_ = k.ctx;
-}
-
-ReusedCtx::~ReusedCtx() {
-    if (ctx_ == nullptr) return;
-    const Kept& k = kept();
-    LIST* sets = ctx_->src_list;
-    while (sets->count > 0) list_removeat(sets, 0, kova_free_sourceset);
-    // Every scalar back to its first value; the owned parts keep their addresses.
-    *ctx_ = k.fields;
-    *ctx_->prev_param = k.prev;
-    *ctx_->osc = k.osc;
-    *ctx_->eq = k.eq;
 }
 
 }  // namespace kova_fuzz

@@ -74,17 +74,17 @@ int32_t checked_gen(KOVA_CTX* ctx, const KOVA_PARAM& ev, int32_t buffer_bytes);
 // The usual engine format: 48000 Hz stereo with position panning on a 1080 x 2280 screen.
 constexpr KOVA_FORMAT kPhoneFormat{48000, 2, 1, 1080, 2280};
 
-// One engine context kept across inputs: creating one per input costs more than most inputs.
-// A ReusedCtx hands it out exactly as kova_init left it (a different format replaces it), and on
-// leaving the scope frees the sets registered meanwhile and restores every field, the oscillator
-// and the equaliser from the images taken after kova_init. So each execution frees what it
-// allocated, as libFuzzer's leak check expects. get() is null for a format kova_init refuses.
-class ReusedCtx {
+// An engine context for one input, deinitialised (and checked to be) when it goes out of scope,
+// so each execution frees what it allocated, as libFuzzer's leak check expects. get() is null
+// for a format kova_init refuses; init_error() then holds its code.
+class ScopedCtx {
    public:
-    explicit ReusedCtx(const KOVA_FORMAT& f);
-    ~ReusedCtx();
-    ReusedCtx(const ReusedCtx&) = delete;
-    ReusedCtx& operator=(const ReusedCtx&) = delete;
+    explicit ScopedCtx(const KOVA_FORMAT& f) { ctx_ = kova_init(&f, &err_); }
+    ~ScopedCtx() {
+        if (ctx_ != nullptr) FUZZ_CHECK(kova_deinit(ctx_) == KOVA_OK);
+    }
+    ScopedCtx(const ScopedCtx&) = delete;
+    ScopedCtx& operator=(const ScopedCtx&) = delete;
     KOVA_CTX* get() const { return ctx_; }
     int32_t init_error() const { return err_; }
 
