@@ -5,8 +5,8 @@
 // Each run builds the same set through the engine, saves it as srcset-ARCH.kss in the exchange
 // directory (KOVA_XARCH_DIR; a fresh temporary directory when unset) and checks the bytes against
 // an image encoded here field by field in little-endian order. It then reads every srcset-*.kss
-// found there, whichever machine wrote it, and checks what the engine and the file queries make
-// of it, and compares the sound a fixed stroke produces from it with gen-*.pcm of other machines.
+// found there, whichever machine wrote it, checks that it saves again to the same image, and
+// compares the sound a fixed stroke produces from it with gen-*.pcm of other machines.
 // scripts/aarch64.sh runs this test natively, then under qemu-aarch64, then natively again, so
 // each machine reads the other's file, and compares the files of both machines byte for byte.
 #include <gtest/gtest.h>
@@ -152,8 +152,9 @@ class CrossArch : public testing::Test {
     KOVA_CTX* ctx_ = nullptr;
 };
 
-// Every machine's file, this one's included, is the little-endian image and reads back the same:
-// file queries, the engine's repeat points, and a re-save.
+// Every machine's file, this one's included, is the little-endian image and reads back to the
+// same set: saved again, it is the image once more. (With the bytes equal everywhere, the file
+// queries and repeat points are those the source suites check on each machine.)
 TEST_F(CrossArch, FilesFromEveryMachineAreTheImageAndReadTheSame) {
     const Bytes expected = expected_file(KOVA_ORIGIN_FILE);
     const std::vector<std::string> sets = files("srcset-", ".kss");
@@ -162,27 +163,9 @@ TEST_F(CrossArch, FilesFromEveryMachineAreTheImageAndReadTheSame) {
         SCOPED_TRACE(path);
         EXPECT_TRUE(read_file(path) == expected);
 
-        int off[3] = {-7, -7, -7}, size[3] = {-7, -7, -7};
-        ASSERT_EQ(kova_get_pcminfo_fromfile(path.c_str(), &off[0], &size[0], &off[1], &size[1],
-                                            &off[2], &size[2]),
-                  KOVA_OK);
-        int at = 4 + 40 * 2 + 88 + 20;
-        for (int slot = 0; slot < 3; ++slot) {
-            at += 48;  // the source record
-            EXPECT_EQ(off[slot], at);
-            EXPECT_EQ(size[slot], kSizes[slot]);
-            at += kSizes[slot];
-        }
-
         int32_t err = 0;
         const int32_t id = kova_reg_src_bysavefile(ctx_, path.c_str(), &err);
         ASSERT_GE(id, 1) << err;
-        KOVA_RPT_INFO rpt{};
-        ASSERT_EQ(kova_get_rptinfo(ctx_, id, &rpt), KOVA_OK);
-        const KOVA_RPT_INFO want{
-            {20, 100, 10}, {0, kLoopRepeatMs[0], 0}, {20, kLoopRepeatMs[1], 10}};
-        EXPECT_EQ(std::memcmp(&rpt, &want, sizeof rpt), 0);
-
         // Saved again here, it is the same file with every source now marked as read back.
         const std::string again = own_dir_.file("resaved");
         std::remove(again.c_str());
