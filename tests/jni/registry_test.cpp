@@ -348,6 +348,7 @@ TEST_F(Locking, DeinitDestroyingTheLockStrandsNoCaller) {
 // An instance whose device has stalled (each burst takes 2.5 s to write) is torn down while
 // another instance keeps calling: deinit holds the registry lock only for its bounded release of
 // the device, so the other instance's call gets through well before the stalled write ends.
+// (AddressSanitizer sees any use of the freed stream by the held-up thread.)
 TEST_F(Locking, DeinitOfAStalledInstanceDoesNotHoldUpOthers) {
     kova_host_use_stall_sink(2500);
     ASSERT_EQ(init_default(), 1);
@@ -363,7 +364,10 @@ TEST_F(Locking, DeinitOfAStalledInstanceDoesNotHoldUpOthers) {
     EXPECT_LT(std::chrono::steady_clock::now() - t0, 1500ms);
     owner.join();
     EXPECT_EQ(deinit(2), 0);
+    // The released stream is never called back, also not once its held-up thread ends.
+    const unsigned long callbacks = kova_host_callbacks();
     EXPECT_TRUE(wait_for([] { return kova_host_lingering_tracks() == 0; }));
+    EXPECT_EQ(kova_host_callbacks(), callbacks);
 }
 
 }  // namespace
