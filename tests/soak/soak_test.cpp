@@ -176,7 +176,7 @@ class Producer {
     Bytes written_;
 };
 
-TEST(Soak, InstancesStreamStrokesWithoutLossUnderrunOrGrowth) {
+TEST(Soak, InstancesStreamStrokesWithoutLossOrGrowth) {
     jni_test::Sounds snd(kSlotBytes[0], kSlotBytes[1], kSlotBytes[2]);
     kova_host::use_sink_factory([](uint32_t, uint32_t) -> std::unique_ptr<kova_host::AudioSink> {
         auto device = std::make_unique<DeviceLog>();
