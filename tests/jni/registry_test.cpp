@@ -197,19 +197,6 @@ TEST_F(Registry, LoadHookCreatesLockAndRegistryOnceAndOnlyWithAnEnvironment) {
     _KovaInfoDelbyKova(&marker);
 }
 
-// A deinit that finds an instance destroys the lock; calls without a lock do not create one.
-TEST_F(Registry, DeinitDestroysTheLockAndInitMakesAFreshOne) {
-    ASSERT_EQ(init_default(), 1);
-    EXPECT_EQ(deinit(1), 0);
-    EXPECT_EQ(gpKovaMutex, nullptr);
-    EXPECT_EQ(deinit(1), 0);
-    EXPECT_EQ(set_volume(1), -3);
-    EXPECT_EQ(gpKovaMutex, nullptr);
-    EXPECT_EQ(init_default(), 1);
-    ASSERT_NE(gpKovaMutex, nullptr);
-    EXPECT_TRUE(is_free(gpKovaMutex));  // created unlocked, left unlocked
-}
-
 TEST_F(Registry, FailedInitReleasesEverythingAndLeavesNoSlot) {
     EXPECT_EQ(JAVA(init, 48000, 1, 1, 1080, 2280), -1);
     kova_host_fail_next_open(-19);
@@ -252,15 +239,19 @@ TEST_F(Registry, RefusedTeardownsKeepTheSlot) {
     EXPECT_EQ(pKOVAInfo[0].pInstance, inst);
     EXPECT_EQ(inst->pFastTrack, nullptr);
     EXPECT_EQ(inst->pcm.data, nullptr);
-    EXPECT_EQ(gpKovaMutex, nullptr);
-    // Without its buffer the instance generates nothing.
+    EXPECT_EQ(gpKovaMutex, nullptr);  // any deinit that finds an instance destroys the lock
+    // Without its buffer the instance generates nothing; a call without a lock makes none.
     EXPECT_EQ(JAVA(gen_1tofasttrack, 1, 5, 5, 0, 0, 0), 0);
+    EXPECT_EQ(gpKovaMutex, nullptr);
     inst->pCtx->tag = KOVA_CTX_TAG;
     EXPECT_EQ(deinit(1), 0);
     EXPECT_EQ(pKOVAInfo[0].isUsed, 0);
 
-    // Without an engine context the teardown reports it and keeps the slot as well.
+    // Without an engine context the teardown reports it and keeps the slot as well. The init
+    // before makes a fresh lock, created and left unlocked.
     ASSERT_EQ(init_default(), 1);
+    ASSERT_NE(gpKovaMutex, nullptr);
+    EXPECT_TRUE(is_free(gpKovaMutex));
     inst = pKOVAInfo[0].pInstance;
     drop_context(0);
     EXPECT_EQ(deinit(1), -3);
