@@ -343,12 +343,17 @@ TEST_F(JavaContract, MethodsRefuseIdsWithoutInstanceOrContext) {
     EXPECT_EQ(g_got, 8);  // three strings and the array, all released
     EXPECT_EQ(g_released, 8);
     EXPECT_EQ(inst->curSrc, 0);
-    EXPECT_EQ(jni_test::jni_lines(cap),
-              (jni_test::Lines{"kova_set_thickness() is failed. (ID is NULL)",
-                               "kova_set_volume() is failed. (ID is NULL)"}));
     JAVA(start_1fasttrack, 1);  // the stream is still there
     EXPECT_EQ(inst->pFastTrack->state, 1);
     JAVA(stop_1fasttrack, 1);
+    // Its teardown reports the missing context and keeps the slot (without stream and buffer).
+    EXPECT_EQ(jni_test::deinit(1), -3);
+    EXPECT_EQ(pKOVAInfo[0].pInstance, inst);
+    EXPECT_EQ(inst->pFastTrack, nullptr);
+    EXPECT_EQ(jni_test::jni_lines(cap),
+              (jni_test::Lines{"kova_set_thickness() is failed. (ID is NULL)",
+                               "kova_set_volume() is failed. (ID is NULL)", "kova_deinit()",
+                               "kova_deinit() is failed. error=-3"}));
     inst->pCtx = ctx;
     EXPECT_EQ(out.items, std::vector<jbyte>(64, 0x5a));
 
