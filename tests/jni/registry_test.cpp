@@ -326,6 +326,7 @@ TEST_F(Locking, DeinitOfAStalledInstanceDoesNotHoldUpOthers) {
     EXPECT_EQ(JAVA(get_1src_1num, 2), 0);
     EXPECT_LT(std::chrono::steady_clock::now() - t0, 1500ms);
     owner.join();
+    EXPECT_EQ(kova_host_lingering_tracks(), 1u);  // released while its write still stalls
     EXPECT_EQ(deinit(2), 0);
     EXPECT_TRUE(wait_for([] { return kova_host_lingering_tracks() == 0; }));
 }
