@@ -357,9 +357,10 @@ TEST_F(JavaContract, MethodsRefuseIdsWithoutInstanceOrContext) {
     inst->pCtx = ctx;
     EXPECT_EQ(out.items, std::vector<jbyte>(64, 0x5a));
 
-    // The last slot's id names an instance like any other.
+    // The last slot's id names an instance like any other; with every slot taken, init gives 0.
     for (jlong id = 2; id <= KOVA_MAX_INSTANCES; ++id) ASSERT_EQ(jni_test::init_default(), id);
     EXPECT_EQ(JAVA(set_1volume, KOVA_MAX_INSTANCES, 0.5), 0);
+    EXPECT_EQ(jni_test::init_default(), 0);
 }
 
 }  // namespace
