@@ -135,12 +135,15 @@ TEST(ApiContract, EngineCallsRefuseNullDeadAndOutOfRange) {
             E(kova_update_src_byfiles(c, i, missing, &err), 0, kBad),
         });
     }
-    // Generation: both entry points refuse the same requests, leaving the buffer alone. (Refused
-    // events: the generation fuzz target's replay.)
+    // Generation: both entry points refuse the same requests, leaving the buffer alone.
+    const KOVA_PARAM bad[] = {
+        kova_test::event(-1, 140, 1032, 1), kova_test::event(170, -0.5f, 1032, 1),
+        kova_test::event(170, 140, -1, 1), kova_test::event(170, 140, 1032, 3)};
     for (auto gen : {kova_gen_sounds, kova_gen_samples}) {
         check({R(gen(nullptr, &move, &out), 0), R(gen(&dead, &move, &out), 0),
                R(gen(ctx, nullptr, &out), 0), R(gen(ctx, &move, nullptr), 0),
                R(gen(ctx, &move, &empty), 0), R(gen(ctx, &move, &no_data), 0)});
+        for (const KOVA_PARAM& ev : bad) check({R(gen(ctx, &ev, &out), 0)});
     }
     kova_set_param(nullptr, &move);
     kova_set_param(ctx->prev_param, nullptr);
