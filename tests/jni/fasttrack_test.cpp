@@ -1,33 +1,28 @@
 // SPDX-License-Identifier: Apache-2.0
 // The output stream from its ring buffer up: the ring against a plain queue, the fast-track calls
-// with the device held (log lines, all-or-nothing writes, the callback) and a close while the
-// device stalls. That the device receives exactly the written blocks across underruns, the soak
-// suite and the Java suite check on the stand-in device's own thread.
+// with the device held (log lines, all-or-nothing writes, the callback). That the device receives
+// exactly the written blocks across underruns, the soak suite and the Java suite check on the
+// stand-in device's own thread; a close while the device stalls, the registry suite.
 #include "kova/android/kova_fasttrack.h"
 
 #include <android/log.h>
 #include <gtest/gtest.h>
 #include <media/AudioTrack.h>
 
-#include <chrono>
 #include <deque>
 #include <memory>
 #include <numeric>
 #include <random>
 #include <string>
-#include <thread>
 #include <vector>
 
 #include "kova/kova_output.h"
-#include "jni/jni_test_support.h"
 #include "kova_host/audio_sink.h"
 #include "support/log_capture.h"
 #include "util/kova_mem.h"
 
 namespace {
 
-using namespace std::chrono_literals;
-using jni_test::wait_for;
 using kova_test::LogLine;
 
 std::vector<uint8_t> pattern(size_t n, uint8_t first) {
@@ -38,24 +33,9 @@ std::vector<uint8_t> pattern(size_t n, uint8_t first) {
 
 using Ring = std::unique_ptr<KOVA_RINGBUFFER, decltype(&kova_ringbuffer_free)>;
 
-TEST(RingBuffer, SizeIsAPowerOfTwoOfAtLeastTwoAndHoldsOneByteLess) {
-    for (auto [requested, size] : std::vector<std::pair<uint32_t, uint32_t>>{
-             {0, 2}, {1, 2}, {2, 2}, {3, 4}, {4097, 8192}, {384000, 524288}}) {
-        Ring rb(kova_ringbuffer_create(requested), kova_ringbuffer_free);
-        ASSERT_NE(rb, nullptr) << requested;
-        const std::vector<uint8_t> block = pattern(size, 3);
-        EXPECT_EQ(kova_ringbuffer_write(rb.get(), block.data(), size), size - 1) << requested;
-        EXPECT_EQ(kova_ringbuffer_write_space(rb.get()), 0u);
-        EXPECT_EQ(kova_ringbuffer_read_space(rb.get()), size - 1);
-    }
-    // No 32-bit power of two covers this: refused before any allocation.
-    const unsigned long before = kova_mem_alloc_count();
-    EXPECT_EQ(kova_ringbuffer_create(0xFFFFFFFFu), nullptr);
-    EXPECT_EQ(kova_mem_alloc_count(), before);
-}
-
 // Random writes and reads against a plain queue: contents, order and both spaces agree at every
-// step, across many wraps; a reset empties the queue and zeroes the storage.
+// step, across many wraps (a ring holds one byte less than its size); a reset empties the queue
+// and zeroes the storage.
 TEST(RingBuffer, AgreesWithAQueueUnderRandomTraffic) {
     Ring rb(kova_ringbuffer_create(256), kova_ringbuffer_free);
     std::deque<uint8_t> model;
@@ -84,6 +64,15 @@ TEST(RingBuffer, AgreesWithAQueueUnderRandomTraffic) {
     EXPECT_EQ(kova_ringbuffer_read_space(rb.get()), 0u);
     EXPECT_EQ(kova_ringbuffer_write_space(rb.get()), 255u);
     EXPECT_TRUE(std::all_of(rb->buf, rb->buf + 256, [](uint8_t b) { return b == 0; }));
+
+    // The smallest ring holds one byte (the stream's ring, rounded up to a power of two, is
+    // measured by FastTrack.WritesAreAllOrNothingAndOnlyWhilePlaying). No 32-bit power of two
+    // covers 2^32 - 1: refused before any allocation.
+    Ring tiny(kova_ringbuffer_create(0), kova_ringbuffer_free);
+    EXPECT_EQ(kova_ringbuffer_write(tiny.get(), buf.data(), 2), 1u);
+    const unsigned long before = kova_mem_alloc_count();
+    EXPECT_EQ(kova_ringbuffer_create(0xFFFFFFFFu), nullptr);
+    EXPECT_EQ(kova_mem_alloc_count(), before);
 }
 
 // The device is held so that nothing but the test drains the ring.
@@ -115,10 +104,8 @@ TEST_F(FastTrack, OpenStartStopAndCloseLogTheirLinesOnce) {
     KOVA_FASTTRACK* other = kova_open_fasttrack(48000, 2);
     ASSERT_NE(other, nullptr);
     kova_start_fasttrack(other);
-    EXPECT_EQ(other->state, 1);
     kova_start_fasttrack(other);  // already playing: nothing
     kova_stop_fasttrack(other);
-    EXPECT_EQ(other->state, 0);
     kova_stop_fasttrack(other);  // already stopped: nothing
     kova_close_fasttrack(other, 1);
     const LogLine closed = line("kova_close_fasttrack() is finished successfully");
@@ -151,71 +138,39 @@ TEST_F(FastTrack, WritesAreAllOrNothingAndOnlyWhilePlaying) {
     EXPECT_EQ(write(block, 3840), 287u);  // does not fit whole
     EXPECT_EQ(kova_ringbuffer_read_space(ft->pRing), 524000u);
 
-    // A stop discards what is queued and refuses writes; a new start begins empty.
+    // A stop discards what is queued and refuses writes.
     kova_stop_fasttrack(ft);
     EXPECT_EQ(kova_ringbuffer_read_space(ft->pRing), 0u);
     EXPECT_EQ(write(block, 3840), 0u);
-    kova_start_fasttrack(ft);
-    EXPECT_EQ(kova_ringbuffer_read_space(ft->pRing), 0u);
 }
 
-TEST_F(FastTrack, CallbackHandsOverWhatIsStoredAndNeverPadsOrInvents) {
+// What the callback hands over and how it shortens an underrun, the soak suite checks at the
+// device; here the requests it must leave alone.
+TEST_F(FastTrack, CallbackLeavesOtherRequestsAlone) {
     kova_start_fasttrack(ft);
-    const std::vector<uint8_t> block = pattern(600, 40);
-    ASSERT_EQ(write(block, 600), 600u);
+    ASSERT_EQ(write(pattern(600, 40), 600), 600u);
     std::vector<uint8_t> room(1024, 0xEE);
     android::AudioTrack::Buffer buffer{};
-    buffer.size = 1024;
-    buffer.raw = room.data();
     auto pull = [&](int event, void* user, size_t size) {
         buffer.size = size;
         FastTrackCallback(event, user, &buffer);
         return buffer.size;
     };
     constexpr int kMore = android::AudioTrack::EVENT_MORE_DATA;
-    EXPECT_EQ(pull(kMore, ft, 1024), 600u);
-    EXPECT_TRUE(std::equal(block.begin(), block.end(), room.begin()));
-    EXPECT_EQ(room[600], 0xEE);
-    EXPECT_EQ(pull(kMore, ft, 1024), 0u);
-
-    // Other events, a missing user pointer and a stopped stream leave the buffer alone.
-    write(block, 600);
-    EXPECT_EQ(pull(android::AudioTrack::EVENT_UNDERRUN, ft, 1024), 1024u);
-    EXPECT_EQ(pull(kMore, nullptr, 1024), 1024u);
-    // A missing buffer is logged; a buffer without data pointer is skipped without a word.
-    log.clear();
+    // A buffer without data pointer is skipped without a word; a missing buffer is logged.
+    EXPECT_EQ(pull(kMore, ft, 32), 32u);
     FastTrackCallback(kMore, ft, nullptr);
     EXPECT_EQ(log.lines(),
-              std::vector<LogLine>{line("FastTrackCallback(event:0, parameter error)")});
-    buffer.raw = nullptr;
-    EXPECT_EQ(pull(kMore, ft, 32), 32u);
-    EXPECT_EQ(kova_ringbuffer_read_space(ft->pRing), 600u);
+              (std::vector<LogLine>{line("kova_start_fasttrack()"),
+                                    line("FastTrackCallback(event:0, parameter error)")}));
+    // Other events, a missing user pointer and a stopped stream leave the buffer alone.
     buffer.raw = room.data();
+    EXPECT_EQ(pull(android::AudioTrack::EVENT_UNDERRUN, ft, 1024), 1024u);
+    EXPECT_EQ(pull(kMore, nullptr, 1024), 1024u);
+    EXPECT_EQ(kova_ringbuffer_read_space(ft->pRing), 600u);
     kova_stop_fasttrack(ft);
     EXPECT_EQ(pull(kMore, ft, 1024), 1024u);
-}
-
-// A device that stopped draining: closing the stream returns after a short, bounded wait, the
-// callback is never called again (the handle is freed by then; AddressSanitizer would see it),
-// and the held-up thread ends on its own once its write returns.
-TEST(FastTrackDevice, CloseDuringAStalledWriteIsBounded) {
-    kova_host_use_stall_sink(1500);
-    kova_host_reset_counters();
-    KOVA_FASTTRACK* ft = kova_open_fasttrack(48000, 2);
-    kova_host_use_null_sink();
-    ASSERT_NE(ft, nullptr);
-    kova_start_fasttrack(ft);
-    ASSERT_TRUE(wait_for([] { return kova_host_callbacks() >= 1; }));  // now in its 1.5 s write
-    const unsigned long callbacks = kova_host_callbacks();
-
-    const auto t0 = std::chrono::steady_clock::now();
-    kova_stop_fasttrack(ft);
-    kova_close_fasttrack(ft, 1);
-    EXPECT_LT(std::chrono::steady_clock::now() - t0, 600ms);
-    EXPECT_EQ(kova_host_lingering_tracks(), 1u);
-
-    ASSERT_TRUE(wait_for([] { return kova_host_lingering_tracks() == 0; }));
-    EXPECT_EQ(kova_host_callbacks(), callbacks);
+    EXPECT_EQ(room, std::vector<uint8_t>(1024, 0xEE));
 }
 
 }  // namespace

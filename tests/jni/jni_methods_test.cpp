@@ -4,7 +4,6 @@
 // stream and the table rows copied into Java arrays.
 #include "jni/jni_test_support.h"
 #include "kova/kova_output.h"
-#include "kova_host/audio_sink.h"
 
 namespace {
 
@@ -26,10 +25,6 @@ class Methods : public jni_test::Loaded {
         ASSERT_EQ(init_default(), 1);
         g_got = g_released = 0;
         cap.clear();
-    }
-    void TearDown() override {
-        kova_host_hold_device(0);
-        Loaded::TearDown();
     }
 
     jni_test::Sounds snd;
@@ -89,25 +84,19 @@ TEST_F(Methods, TuningThicknessAndVolumeReachTheEngine) {
                "kova_set_volume(1,0.500000)", "kova_set_volume(1) is failed. (err : -3)"}));
 }
 
-// gen_sounds and gen_tofasttrack hand the engine the event as given: a reference context fed the
-// same events directly produces the same bytes. The ring buffer is read back with the device
-// held, so it holds exactly what was written.
-TEST_F(Methods, GeneratedBlocksMatchTheEngineAndReachTheStreamWhole) {
+// gen_sounds hands the engine the event as given: a reference context fed the same events
+// directly produces the same bytes. (That gen_tofasttrack streams the same blocks whole, the Java
+// and soak suites check on the device.)
+TEST_F(Methods, GeneratedBlocksMatchTheEngine) {
     ASSERT_EQ(reg(1, snd), 1);
-    ASSERT_EQ(init_default(), 2);
-    ASSERT_EQ(reg(2, snd), 1);
     KOVA_FORMAT f{48000, 2, 1, 1080, 2280};
     int32_t err = 0;
     KOVA_CTX* ref = kova_init(&f, &err);
     ASSERT_EQ(kova_reg_src_byfiles(ref, snd.path, &err), 1);
     std::vector<int16_t> ref_buf(480000);
     KOVA_PCMBUF ref_pcm{ref_buf.data(), 960000};
-
-    KOVA_FASTTRACK* ft = pKOVAInfo[1].pInstance->pFastTrack;
-    kova_host_hold_device(1);
     Array<jbyte> out(960000);
-    std::vector<jbyte> played;
-    g_got = g_released = 0;
+    size_t total = 0;
     jlong t = 1000;
     for (int i = 0; i < 12; ++i) {
         const int action = i == 0 ? 0 : i == 11 ? 2 : 1;
@@ -117,23 +106,12 @@ TEST_F(Methods, GeneratedBlocksMatchTheEngineAndReachTheStreamWhole) {
         ASSERT_EQ(JAVA(gen_1sounds, 1, jbytes(out), x, y, t, 0.5f, action), want);
         ASSERT_TRUE(std::equal(out.items.begin(), out.items.begin() + want,
                                reinterpret_cast<const jbyte*>(ref_buf.data())));
-        ASSERT_EQ(JAVA(gen_1tofasttrack, 2, x, y, t, 0.5f, action), want);
-        if (i == 0) {
-            EXPECT_EQ(kova_ringbuffer_read_space(ft->pRing), 0u);  // stopped: nothing stored
-            JAVA(start_1fasttrack, 2);
-        } else {
-            played.insert(played.end(), out.items.begin(), out.items.begin() + want);
-        }
+        total += static_cast<size_t>(want);
         t += 8 + i % 8;
     }
-    EXPECT_GT(played.size(), 20000u);
-    EXPECT_EQ(g_got, 12);
-    EXPECT_EQ(g_released, 12);
-    std::vector<jbyte> ring(kova_ringbuffer_read_space(ft->pRing));
-    kova_ringbuffer_read(ft->pRing, ring.data(), static_cast<uint32_t>(ring.size()));
-    EXPECT_EQ(ring, played);
-    JAVA(stop_1fasttrack, 2);
-    EXPECT_EQ(ft->state, 0);
+    EXPECT_GT(total, 20000u);
+    EXPECT_EQ(g_got, 15);  // the registration's three strings and the twelve arrays
+    EXPECT_EQ(g_released, 15);
     kova_deinit(ref);
 }
 

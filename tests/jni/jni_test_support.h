@@ -12,10 +12,8 @@
 
 #include <algorithm>
 #include <atomic>
-#include <chrono>
 #include <cmath>
 #include <string>
-#include <thread>
 #include <vector>
 
 #include "kova/kova_engine.h"
@@ -200,16 +198,6 @@ inline void reset_to_unloaded() {
     }
 }
 
-// Waits (bounded, so a broken stream fails instead of hanging) until `done` holds.
-template <typename Pred>
-bool wait_for(Pred done) {
-    const auto give_up = std::chrono::steady_clock::now() + std::chrono::seconds(30);
-    while (!done()) {
-        if (std::chrono::steady_clock::now() > give_up) return false;
-        std::this_thread::sleep_for(std::chrono::milliseconds(2));
-    }
-    return true;
-}
 inline const std::string kPid = std::to_string(getpid());
 
 // Tests that start from a freshly loaded library and leave it unloaded.

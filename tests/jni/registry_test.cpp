@@ -3,8 +3,6 @@
 // treat a busy registry lock); the Java lifecycle that uses it (load and unload hooks, instance
 // creation and destruction, the life of the registry lock); and the serialisation of the Java
 // calls on that lock, also while a deinit destroys it. Run under ThreadSanitizer as well.
-#include <errno.h>
-
 #include <atomic>
 #include <chrono>
 #include <random>
@@ -99,7 +97,6 @@ TEST_F(Registry, UnloadReportsEverySlotWithTheLastEngineResultAndKeepsTheLock) {
     for (int i = 1; i < 4; ++i) {
         ASSERT_EQ(pKOVAInfo[i].isUsed, 1);
         EXPECT_EQ(pKOVAInfo[i].pInstance->pFastTrack, nullptr);
-        EXPECT_EQ(pKOVAInfo[i].pInstance->pcm.data, nullptr);
     }
     EXPECT_EQ(gpKovaMutex, lock);
     EXPECT_TRUE(is_free(lock));
@@ -128,7 +125,6 @@ TEST_F(Registry, DelbyPidSweepsOnlyThatProcess) {
     EXPECT_EQ(pKOVAInfo[2].isUsed, 1);
     ASSERT_EQ(pKOVAInfo[3].isUsed, 1);  // another process id: untouched
     EXPECT_NE(pKOVAInfo[3].pInstance->pFastTrack, nullptr);
-    EXPECT_NE(pKOVAInfo[3].pInstance->pcm.data, nullptr);
     refused->tag = KOVA_CTX_TAG;
     discard(0);
 }
@@ -142,24 +138,6 @@ TEST_F(Registry, SweepsRunWithoutALockTheyCouldNotTake) {
     EXPECT_EQ(pKOVAInfo[0].isUsed, 0);
     EXPECT_FALSE(is_free(lock));
     pthread_mutex_unlock(lock);
-
-    ASSERT_EQ(init_default(), 1);
-    pKOVAInfo[0].pid = 4242;
-    std::atomic<int> stage{0};
-    std::thread holder([&] {
-        pthread_mutex_lock(lock);
-        stage = 1;
-        while (stage != 2) std::this_thread::yield();
-        pthread_mutex_unlock(lock);
-    });
-    while (stage != 1) std::this_thread::yield();
-    _KovaInfoDelbyPid(4242);
-    EXPECT_EQ(pKOVAInfo[0].isUsed, 0);
-    EXPECT_EQ(pthread_mutex_trylock(lock), EBUSY);
-    stage = 2;
-    holder.join();
-    _KovaInfoDelAll();  // free: taken and given back
-    EXPECT_TRUE(is_free(lock));
 
     // No lock at all.
     ASSERT_EQ(init_default(), 1);
@@ -217,19 +195,6 @@ TEST_F(Registry, LoadHookCreatesLockAndRegistryOnceAndOnlyWithAnEnvironment) {
     _KovaInfoDelbyKova(&marker);
 }
 
-// A deinit that finds an instance destroys the lock; calls without a lock do not create one.
-TEST_F(Registry, DeinitDestroysTheLockAndInitMakesAFreshOne) {
-    ASSERT_EQ(init_default(), 1);
-    EXPECT_EQ(deinit(1), 0);
-    EXPECT_EQ(gpKovaMutex, nullptr);
-    EXPECT_EQ(deinit(1), 0);
-    EXPECT_EQ(set_volume(1), -3);
-    EXPECT_EQ(gpKovaMutex, nullptr);
-    EXPECT_EQ(init_default(), 1);
-    ASSERT_NE(gpKovaMutex, nullptr);
-    EXPECT_TRUE(is_free(gpKovaMutex));  // created unlocked, left unlocked
-}
-
 TEST_F(Registry, FailedInitReleasesEverythingAndLeavesNoSlot) {
     EXPECT_EQ(JAVA(init, 48000, 1, 1, 1080, 2280), -1);
     kova_host_fail_next_open(-19);
@@ -272,25 +237,21 @@ TEST_F(Registry, RefusedTeardownsKeepTheSlot) {
     EXPECT_EQ(pKOVAInfo[0].pInstance, inst);
     EXPECT_EQ(inst->pFastTrack, nullptr);
     EXPECT_EQ(inst->pcm.data, nullptr);
-    EXPECT_EQ(gpKovaMutex, nullptr);
-    // Without its buffer the instance generates nothing.
+    EXPECT_EQ(gpKovaMutex, nullptr);  // any deinit that finds an instance destroys the lock
+    // Without its buffer the instance generates nothing; a call without a lock makes none.
     EXPECT_EQ(JAVA(gen_1tofasttrack, 1, 5, 5, 0, 0, 0), 0);
+    EXPECT_EQ(gpKovaMutex, nullptr);
     inst->pCtx->tag = KOVA_CTX_TAG;
     EXPECT_EQ(deinit(1), 0);
     EXPECT_EQ(pKOVAInfo[0].isUsed, 0);
 
-    // Without an engine context the teardown reports it and keeps the slot as well.
-    ASSERT_EQ(init_default(), 1);
-    inst = pKOVAInfo[0].pInstance;
-    drop_context(0);
-    EXPECT_EQ(deinit(1), -3);
-    EXPECT_EQ(pKOVAInfo[0].pInstance, inst);
-    EXPECT_EQ(inst->pFastTrack, nullptr);
     EXPECT_EQ(jni_lines(cap), (Lines{"kova_deinit()", "kova_deinit(id:1) is already completed",
-                                     "kova_deinit()", "kova_deinit(id:1, pid:" + kPid + ")",
-                                     "kova_init()", "kova_init(id:1,48000hz,2ch,p:1,w:1080,h:2280)",
-                                     "kova_deinit()", "kova_deinit() is failed. error=-3"}));
-    discard(0);
+                                     "kova_deinit()", "kova_deinit(id:1, pid:" + kPid + ")"}));
+    // The next init makes a fresh lock, created and left unlocked. (A teardown without engine
+    // context: ApiContract's Java table.)
+    ASSERT_EQ(init_default(), 1);
+    ASSERT_NE(gpKovaMutex, nullptr);
+    EXPECT_TRUE(is_free(gpKovaMutex));
 }
 
 // Owners create, use and destroy instances (each deinit destroys the registry lock) while other
@@ -348,6 +309,7 @@ TEST_F(Locking, DeinitDestroyingTheLockStrandsNoCaller) {
 // An instance whose device has stalled (each burst takes 2.5 s to write) is torn down while
 // another instance keeps calling: deinit holds the registry lock only for its bounded release of
 // the device, so the other instance's call gets through well before the stalled write ends.
+// (AddressSanitizer sees any use of the freed stream by the held-up thread.)
 TEST_F(Locking, DeinitOfAStalledInstanceDoesNotHoldUpOthers) {
     kova_host_use_stall_sink(2500);
     ASSERT_EQ(init_default(), 1);
@@ -362,8 +324,12 @@ TEST_F(Locking, DeinitOfAStalledInstanceDoesNotHoldUpOthers) {
     EXPECT_EQ(JAVA(get_1src_1num, 2), 0);
     EXPECT_LT(std::chrono::steady_clock::now() - t0, 1500ms);
     owner.join();
+    EXPECT_EQ(kova_host_lingering_tracks(), 1u);  // released while its write still stalls
     EXPECT_EQ(deinit(2), 0);
-    EXPECT_TRUE(wait_for([] { return kova_host_lingering_tracks() == 0; }));
+    // The held-up thread ends on its own (bounded, so a broken release fails instead of hanging).
+    for (int i = 0; i < 3000 && kova_host_lingering_tracks() != 0; ++i)
+        std::this_thread::sleep_for(10ms);
+    EXPECT_EQ(kova_host_lingering_tracks(), 0u);
 }
 
 }  // namespace

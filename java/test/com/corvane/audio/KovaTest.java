@@ -60,15 +60,11 @@ class KovaTest {
         return id;
     }
 
-    // Loading the class ran the load hook once; the twenty slots fill and are reused.
+    // Loading the class ran the load hook once. (How the twenty slots fill and are reused, the
+    // registry and Java contract suites check through the same symbols.)
     @Test
-    void loadHookRunsOnceAndTwentyInstancesFitThenSlotsAreReused() {
+    void loadHookRunsOnce() {
         assertEquals(List.of("KOVA_JNI_OnLoad(init)"), KovaTestHooks.LOAD_LINES);
-        for (int i = 1; i <= 20; i++) assertEquals(i, open());
-        assertEquals(0, Kova.init(48000, 2, 1, 1080, 2280));
-        live.remove(0);
-        assertEquals(0, Kova.deinit(1));
-        assertEquals(1, open());
     }
 
     private static boolean endsWith(byte[] got, byte[] tail) {
