@@ -16,7 +16,7 @@
 #include "bench_clock.h"
 #include "bench_files.h"
 #include "bench_registry.h"
-#include "jni_entries.h"
+#include "jni/jni_entries.h"
 #include "kova/kova_engine.h"
 #include "kova/android/kova_registry.h"
 #include "summary.h"

@@ -9,7 +9,7 @@
 #include "alloc_count.h"
 #include "bench_files.h"
 #include "bench_registry.h"
-#include "jni_entries.h"
+#include "jni/jni_entries.h"
 #include "kova/kova_engine.h"
 #include "kova/android/kova_registry.h"
 #include "summary.h"

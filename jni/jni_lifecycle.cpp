@@ -2,6 +2,7 @@
 /* Library load and unload hooks and the Java methods that create and destroy an instance. */
 #include <unistd.h>
 
+#include "jni/jni_entries.h"
 #include "jni/jni_internal.h"
 #include "kova/kova_engine.h"
 #include "util/kova_mem.h"

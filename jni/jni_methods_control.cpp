@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 /* Java methods that register and select sources and set tuning, thickness and volume. */
+#include "jni/jni_entries.h"
 #include "jni/jni_internal.h"
 #include "kova/kova_engine.h"
 

@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 /* Java methods that generate sound for a motion event and start or stop the output stream. */
+#include "jni/jni_entries.h"
 #include "jni/jni_internal.h"
 #include "kova/kova_engine.h"
 

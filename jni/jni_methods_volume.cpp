@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <array>
 
+#include "jni/jni_entries.h"
 #include "jni/jni_internal.h"
 #include "kova/kova_output.h"
 

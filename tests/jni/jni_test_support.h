@@ -16,6 +16,7 @@
 #include <string>
 #include <vector>
 
+#include "jni/jni_entries.h"
 #include "kova/kova_engine.h"
 #include "kova/android/kova_registry.h"
 #include "support/log_capture.h"
@@ -108,31 +109,6 @@ inline JavaVM* vm() {
 }
 
 }  // namespace fake_jni
-
-// The Java entry points, as the VM sees them.
-extern "C" {
-jint JNI_OnLoad(JavaVM*, void*);
-void JNI_OnUnload(JavaVM*, void*);
-jlong Java_com_corvane_audio_Kova_init(JNIEnv*, jclass, jint, jint, jint, jint, jint);
-jint Java_com_corvane_audio_Kova_deinit(JNIEnv*, jclass, jlong);
-jint Java_com_corvane_audio_Kova_reg_1src_1byfiles(JNIEnv*, jclass, jlong, jstring, jstring,
-                                                   jstring);
-jint Java_com_corvane_audio_Kova_set_1src(JNIEnv*, jclass, jlong, jint);
-jint Java_com_corvane_audio_Kova_get_1src_1num(JNIEnv*, jclass, jlong);
-jint Java_com_corvane_audio_Kova_gen_1sounds(JNIEnv*, jclass, jlong, jbyteArray, jfloat, jfloat,
-                                             jlong, jfloat, jint);
-jint Java_com_corvane_audio_Kova_gen_1tofasttrack(JNIEnv*, jclass, jlong, jfloat, jfloat, jlong,
-                                                  jfloat, jint);
-jint Java_com_corvane_audio_Kova_set_1tuneset(JNIEnv*, jclass, jlong, jint, jdouble, jdouble, jint,
-                                              jdouble, jint, jdouble, jdouble, jdouble, jdouble,
-                                              jdouble, jdouble);
-jint Java_com_corvane_audio_Kova_set_1thickness(JNIEnv*, jclass, jlong, jdouble);
-jint Java_com_corvane_audio_Kova_set_1volume(JNIEnv*, jclass, jlong, jdouble);
-void Java_com_corvane_audio_Kova_stop_1fasttrack(JNIEnv*, jclass, jlong);
-void Java_com_corvane_audio_Kova_start_1fasttrack(JNIEnv*, jclass, jlong);
-jint Java_com_corvane_audio_Kova_get_1volumeTableSize(JNIEnv*, jclass, jint);
-jint Java_com_corvane_audio_Kova_get_1volumeTable(JNIEnv*, jclass, jfloatArray, jfloatArray);
-}
 
 // A static native method of the Java class called as the VM would, e.g. JAVA(set_1src, id, 1).
 #define JAVA(method, ...) \
