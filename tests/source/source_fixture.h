@@ -33,12 +33,6 @@ inline Bytes pattern(size_t n, unsigned seed) {
     for (size_t i = 0; i < n; ++i) b[i] = static_cast<uint8_t>(i * 31 + seed * 97 + (i >> 8));
     return b;
 }
-template <typename T>
-T at(const Bytes& b, size_t off) {
-    T v;
-    std::memcpy(&v, b.data() + off, sizeof(T));
-    return v;
-}
 inline void* dup(const void* p, size_t n) {
     return std::memcpy(kova_mem_malloc(n), p, n);
 }
@@ -105,16 +99,6 @@ inline std::vector<int> pcminfo(const std::string& p, int want_rc = KOVA_OK) {
     EXPECT_EQ(kova_get_pcminfo_fromfile(p.c_str(), &o[0], &o[1], &o[2], &o[3], &o[4], &o[5]),
               want_rc);
     return o;
-}
-
-// Filter descriptors of a set as (type, freq) pairs, in list order.
-inline std::vector<std::pair<uint32_t, double>> filters_of(const KOVA_SRCSET* set) {
-    std::vector<std::pair<uint32_t, double>> out;
-    for (NODE* n = set->filters->head->next; n != set->filters->tail; n = n->next) {
-        const auto* d = static_cast<KOVA_FLT_DSC*>(n->data);
-        out.emplace_back(d->type, d->freq);
-    }
-    return out;
 }
 
 #endif
