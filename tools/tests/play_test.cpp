@@ -6,8 +6,6 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <sstream>
-
 #include "support/tool_run.h"
 
 namespace kova_test {
@@ -16,21 +14,10 @@ namespace {
 /* An ALSA device name that exists nowhere, so the tests behave the same with or without a card. */
 const std::string kNoDevice = "kova-test-no-such-device";
 
-/* Down at 0 and a move every 10 ms up to `last_ms`: straight on at 1 px/ms and then up, or to
- * and fro by 10 px and never lifted. */
-std::string gesture(int last_ms, bool to_and_fro) {
-    std::ostringstream g;
-    g << "time_ms,action,x,y\n0,down,100,100\n";
-    for (int t = 10; t <= last_ms; t += 10)
-        g << t << ",move," << 100 + (to_and_fro ? t / 10 % 2 * 10 : t) << ",100\n";
-    if (!to_and_fro) g << last_ms + 10 << ",up,300,100\n";
-    return g.str();
-}
-
 TEST(KovaPlay, CaptureHoldsEveryBlockWithoutADevice) {
     TempDir dir;
     // Down, 20 moves of 10 ms at 1 px/ms, up: 40 ms + 200 ms + 120 ms of blocks.
-    write_file(dir.file("g.csv"), gesture(200, false));
+    write_file(dir.file("g.csv"), "time_ms,action,x,y\n" + stroke_csv(0, 200, 100));
     const RunResult r =
         run_kova({"play", "--gesture", "g.csv", "--device", kNoDevice, "--capture", "cap.wav"},
                  dir.path, 0, {}, true);
@@ -78,7 +65,7 @@ TEST(KovaPlay, StalledDeviceDropsBlocksAndSignalEndsPromptly) {
     write_file(dir.file("alsa.conf"), "pcm.stall { type file slave.pcm { type null } file \"" +
                                           fifo + "\" format \"raw\" }\n");
     // 6 s of moves, far more than the ring and the device's buffers hold.
-    write_file(dir.file("g.csv"), gesture(6000, true));
+    write_file(dir.file("g.csv"), "time_ms,action,x,y\n" + stroke_csv(0, 6000, 100, true));
     const RunResult r = run_kova({"play", "--device", "stall", "--gesture", "g.csv"}, dir.path,
                                  5500, {"ALSA_CONFIG_PATH=" + dir.file("alsa.conf")});
     close(reader);

@@ -5,7 +5,6 @@
 #include <sndfile.h>
 
 #include <set>
-#include <sstream>
 
 #include "support/tool_run.h"
 
@@ -15,24 +14,16 @@ namespace {
 /* Lengths of the built-in start and end sounds, as documented. */
 constexpr size_t kStartMs = 40, kEndMs = 120;
 
-/* Two strokes of 1 px/ms with a pause: down at 0, a move every 10 ms to 500, up at 510; down
- * again at 1500, moves to 1800, up at 1810. */
-std::string two_strokes_csv() {
-    std::ostringstream s;
-    s << "time_ms,action,x,y,aux\n# two strokes\n0,down,100,100\n";
-    for (int t = 10; t <= 500; t += 10) s << t << ",move," << 100 + t << ",100\n";
-    s << "510,up,600,100\n\n1500,down,100,500,0.5\n";
-    for (int t = 1510; t <= 1800; t += 10) s << t << ",move," << 100 + (t - 1500) << ",500\n";
-    s << "1810,up,400,500\n";
-    return s.str();
-}
+/* Two strokes of 1 px/ms with a pause: moves from 10 to 500 ms and from 1510 to 1800 ms. */
+const std::string kTwoStrokes = "time_ms,action,x,y,aux\n# two strokes\n" +
+                                stroke_csv(0, 500, 100) + "\n" + stroke_csv(1500, 1800, 500);
 
 /* Blocks queue back to back within a stroke (start sound, one block per move as long as the time
  * since the event before, end sound); the pause is silent and the second stroke starts at its own
  * time. */
 TEST(KovaRender, PlacesBlocksByTimeWithSilentPauses) {
     TempDir dir;
-    write_file(dir.file("g.csv"), two_strokes_csv());
+    write_file(dir.file("g.csv"), kTwoStrokes);
     for (const auto& [rate, channels] : {std::pair{48000, 2}, {16000, 1}, {44100, 2}}) {
         SCOPED_TRACE(rate);
         const RunResult r =
@@ -89,7 +80,7 @@ double loop_hz(const Wav& w) {
  * and other formats converted (rate, channels, sample type) so the tone keeps its pitch. */
 TEST(KovaRender, SoundFilesKeepTheirSamplesOrTheirPitch) {
     TempDir dir;
-    write_file(dir.file("g.csv"), two_strokes_csv());
+    write_file(dir.file("g.csv"), kTwoStrokes);
     write_tone(dir.file("tone.wav"), SF_FORMAT_WAV | SF_FORMAT_PCM_16, 48000, 2, 1.0);
     write_tone(dir.file("tone.flac"), SF_FORMAT_FLAC | SF_FORMAT_PCM_24, 44100, 1, 1.0);
     write_tone(dir.file("tone.ogg"), SF_FORMAT_OGG | SF_FORMAT_VORBIS, 22050, 2, 1.0);

@@ -78,6 +78,15 @@ int count_lines(const std::string& text) {
     return n;
 }
 
+std::string stroke_csv(int t0, int last_ms, int y, bool to_and_fro) {
+    std::ostringstream s;
+    s << t0 << ",down,100," << y << "\n";
+    for (int t = t0 + 10; t <= last_ms; t += 10)
+        s << t << ",move," << 100 + (to_and_fro ? t / 10 % 2 * 10 : t - t0) << "," << y << "\n";
+    if (!to_and_fro) s << last_ms + 10 << ",up,300," << y << "\n";
+    return s.str();
+}
+
 void write_tone(const std::string& path, int format, int rate, int channels, double seconds) {
     SF_INFO info{};
     info.samplerate = rate;
