@@ -1,7 +1,15 @@
 // SPDX-License-Identifier: Apache-2.0
+// The file-access layer every file of the library goes through.
+#include <gtest/gtest.h>
 #include <sys/stat.h>
 
-#include "source_fixture.h"
+#include <cstring>
+#include <filesystem>
+#include <fstream>
+
+#include "kova/kova_source.h"
+#include "support/temp_dir.h"
+#include "util/kova_mem.h"
 
 namespace {
 
@@ -17,13 +25,14 @@ struct Opened {
 };
 
 TEST(FileAccess, PathLimitPositionsAndSize) {
-    TempDir t;
+    kova_test::TempDir t;
     const std::string dir = t.file(std::string(250, 'd'));
     std::filesystem::create_directory(dir);
     const std::string path = dir + "/" + std::string(511 - dir.size() - 1, 'f');  // 511 chars
-    const Bytes data = pattern(1000, 2);
-    write_file(path, data);
-    write_file(path + "g", data);
+    std::string data(1000, '\0');
+    for (size_t i = 0; i < data.size(); ++i) data[i] = static_cast<char>(i * 31 + (i >> 8));
+    std::ofstream(path) << data;
+    std::ofstream(path + "g") << data;
     EXPECT_EQ(Opened(path + "g", 0).h, nullptr);  // 512 characters: refused though it exists
     EXPECT_EQ(Opened(t.file("missing"), 0).h, nullptr);
     Opened f(path, 2);  // bit 0 clear: read-only
@@ -34,28 +43,29 @@ TEST(FileAccess, PathLimitPositionsAndSize) {
     EXPECT_EQ(pos, 400);  // getsize put the position back
     EXPECT_EQ(f.m.skip(f.h, &zero) + f.m.skip(f.h, &neg) + f.m.setpos(f.h, &neg), -3);
     EXPECT_EQ(f.m.skip(f.h, &fwd), 0);  // the refused moves left the position at 400
-    uint8_t b = 0;
+    char b = 0;
     EXPECT_EQ(f.m.read(f.h, &b, 1), 1);
     EXPECT_EQ(b, data[650]);
     EXPECT_EQ(f.m.write(f.h, &b, 1), -1);
 }
 
 TEST(FileAccess, WriteOpenCreates0644AndKeepsTheOldTail) {
-    TempDir t;
+    kova_test::TempDir t;
     const mode_t old = umask(022);
     EXPECT_NE(Opened(t.file("new"), 1).h, nullptr);
     umask(old);
     struct stat st {};
     ASSERT_EQ(stat(t.file("new").c_str(), &st), 0);
     EXPECT_EQ(st.st_mode & 0777, 0644u);
-    write_file(t.file("old"), Bytes{'A', 'B', 'C', 'D'});
+    std::ofstream(t.file("old")) << "ABCD";
     {
         Opened f(t.file("old"), 1);
         EXPECT_EQ(f.m.write(f.h, "xy", 2), 2);
         // A handle holding no descriptor is only freed (the leak checker sees the rest).
         f.m.close(std::memset(kova_mem_malloc(4), 0xFF, 4));
     }
-    EXPECT_EQ(read_file(t.file("old")), (Bytes{'x', 'y', 'C', 'D'}));
+    std::ifstream in(t.file("old"));
+    EXPECT_EQ(std::string(std::istreambuf_iterator<char>(in), {}), "xyCD");
 }
 
 }  // namespace
