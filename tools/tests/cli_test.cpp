@@ -145,19 +145,5 @@ TEST(KovaCli, OutputsThroughLinksAndToStandardOutput) {
     EXPECT_TRUE(read_file(dir.file("q.wav")) == wav);
 }
 
-TEST(KovaCli, GestureCommandPrintsCsvThatRenderReads) {
-    TempDir dir;
-    RunResult r = run_kova({"gesture", "fast", "--touch-rate", "60", "-o", "fast.csv"}, dir.path);
-    ASSERT_EQ(r.code, 0) << r.err;
-    const std::string csv = read_file(dir.file("fast.csv"));
-    EXPECT_EQ(csv.rfind("time_ms,action,x,y,aux\n0,down,", 0), 0u) << csv.substr(0, 200);
-    EXPECT_TRUE(has(csv, ",up,"));
-    EXPECT_TRUE(has(csv, "\n17,move,")) << "300 ms at 60 Hz: moves every 16 or 17 ms";
-    // As a spreadsheet saves it: with a UTF-8 byte-order mark.
-    write_file(dir.file("fast.csv"), "\xEF\xBB\xBF" + csv);
-    r = run_kova({"render", "--gesture", "fast.csv", "-o", "fast.wav"}, dir.path);
-    EXPECT_EQ(r.code, 0) << r.err;
-}
-
 }  // namespace
 }  // namespace kova_test

@@ -48,22 +48,23 @@ TEST(KovaRender, PlacesBlocksByTimeWithSilentPauses) {
     }
 }
 
-/* Without options: the built-in gesture the gesture command prints (there with coordinates
- * rounded to 0.1 px, so only the length compares), at 48 kHz stereo, loud
- * enough to hear next to other sounds with headroom (a peak of -6 to -1 dBFS). */
-TEST(KovaRender, DefaultsRenderTheBuiltInGesture) {
+/* The gesture command prints the built-in gestures as CSV, which reads back with a spreadsheet's
+ * byte-order mark in front; without options, render plays those strokes, loud enough to hear next
+ * to other sounds with headroom (a peak of -6 to -1 dBFS). */
+TEST(KovaRender, DefaultsRenderTheGestureTheGestureCommandPrints) {
     TempDir dir;
-    ASSERT_EQ(run_kova({"gesture", "strokes", "-o", "strokes.csv"}, dir.path).code, 0);
-    ASSERT_EQ(run_kova({"render", "--gesture", "strokes.csv", "-o", "csv.wav"}, dir.path).code, 0);
-    const RunResult r = run_kova({"render", "-o", "stroke.wav"}, dir.path);
-    ASSERT_EQ(r.code, 0) << r.err;
-    EXPECT_TRUE(has(r.out, "stroke.wav"));
+    ASSERT_EQ(run_kova({"gesture", "strokes", "-o", "s.csv"}, dir.path).code, 0);
+    const std::string csv = read_file(dir.file("s.csv"));
+    EXPECT_EQ(csv.rfind("time_ms,action,x,y,aux\n0,down,", 0), 0u) << csv.substr(0, 200);
+    write_file(dir.file("s.csv"), "\xEF\xBB\xBF" + csv);
+    ASSERT_EQ(run_kova({"render", "--gesture", "s.csv", "-o", "csv.wav"}, dir.path).code, 0);
+    ASSERT_EQ(run_kova({"render", "-o", "stroke.wav"}, dir.path).code, 0);
     const Wav w = read_wav(dir.file("stroke.wav"));
     EXPECT_EQ(w.frames(), read_wav(dir.file("csv.wav")).frames());
-    EXPECT_EQ(w.rate, 48000);
-    EXPECT_EQ(w.channels, 2);
     EXPECT_GE(peak(w, 0, w.frames()), 16423);
     EXPECT_LE(peak(w, 0, w.frames()), 29205);
+    const RunResult r = run_kova({"gesture", "fast", "--touch-rate", "60", "-o", "-"}, dir.path);
+    EXPECT_TRUE(has(r.out, "\n17,move,") && !has(r.out, "\n8,move,")) << "every 16 or 17 ms";
 }
 
 /* Frequency of channel 0 over the first moves of the first stroke, by zero crossings. */
