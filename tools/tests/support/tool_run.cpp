@@ -71,13 +71,6 @@ bool has(const std::string& text, const std::string& part) {
     return text.find(part) != std::string::npos;
 }
 
-int count_lines(const std::string& text) {
-    int n = 0;
-    std::istringstream in(text);
-    for (std::string line; std::getline(in, line);) n += !line.empty();
-    return n;
-}
-
 std::string stroke_csv(int t0, int last_ms, int y, bool to_and_fro) {
     std::ostringstream s;
     s << t0 << ",down,100," << y << "\n";
