@@ -12,11 +12,27 @@
 namespace kova_test {
 namespace {
 
+/* A command and the parts of what it prints. */
+struct Case {
+    std::vector<std::string> args;
+    std::vector<std::string> parts;
+};
+
+/* Runs `c`: exit `code`, and every part in standard output on success, otherwise in the one line
+ * on standard error. */
+void expect_run(const Case& c, const TempDir& dir, int code) {
+    const RunResult r = run_kova(c.args, dir.path);
+    SCOPED_TRACE(testing::PrintToString(c.args));
+    EXPECT_EQ(r.code, code);
+    if (code != 0) {
+        EXPECT_EQ(std::count(r.err.begin(), r.err.end(), '\n'), 1) << r.err;
+    }
+    const std::string& text = code ? r.err : r.out;
+    for (const std::string& part : c.parts) EXPECT_TRUE(has(text, part)) << text;
+}
+
 TEST(KovaCli, HelpListsCommandsOptionsAndStartingTuneValues) {
-    const struct {
-        std::vector<std::string> args;
-        std::vector<std::string> parts;
-    } cases[] = {
+    const Case cases[] = {
         {{"--help"}, {"render", "play", "save", "inspect", "gesture"}},
         {{"render", "--help"},
          {"--gesture", "--png", "built-in   1     0.2   1         0.2       1       1",
@@ -25,19 +41,12 @@ TEST(KovaCli, HelpListsCommandsOptionsAndStartingTuneValues) {
         {{"--version"}, {"kova 1."}},
     };
     TempDir dir;
-    for (const auto& c : cases) {
-        const RunResult r = run_kova(c.args, dir.path);
-        EXPECT_EQ(r.code, 0);
-        for (const std::string& part : c.parts) EXPECT_TRUE(has(r.out, part)) << part << r.out;
-    }
+    for (const Case& c : cases) expect_run(c, dir, 0);
 }
 
 /* Exit 2 and one line on standard error naming what was wrong: with every listed part. */
 TEST(KovaCli, UsageErrorsNameTheValueAndTheRange) {
-    const struct {
-        std::vector<std::string> args;
-        std::vector<std::string> parts;
-    } cases[] = {
+    const Case cases[] = {
         {{}, {}},
         {{"paint"}, {"paint"}},
         {{"render", "--colour", "red"}, {"--colour"}},
@@ -66,13 +75,7 @@ TEST(KovaCli, UsageErrorsNameTheValueAndTheRange) {
         {{"inspect"}, {}},
     };
     TempDir dir;
-    for (const auto& c : cases) {
-        const RunResult r = run_kova(c.args, dir.path);
-        SCOPED_TRACE(testing::PrintToString(c.args));
-        EXPECT_EQ(r.code, 2);
-        EXPECT_EQ(std::count(r.err.begin(), r.err.end(), '\n'), 1) << r.err;
-        for (const std::string& part : c.parts) EXPECT_TRUE(has(r.err, part)) << r.err;
-    }
+    for (const Case& c : cases) expect_run(c, dir, 2);
     EXPECT_EQ(count_files(dir.path), 0u) << "a refused command wrote a file";
 }
 
@@ -91,10 +94,7 @@ TEST(KovaCli, FailuresExitOneAndKeepTheOutput) {
     ASSERT_EQ(truncate(dir.file("big.csv").c_str(), (64 << 20) + 1), 0);  // one byte too many
     const std::string no_device = "kova-test-no-such-device";
 
-    const struct {
-        std::vector<std::string> args;
-        std::vector<std::string> parts;
-    } cases[] = {
+    const Case cases[] = {
         {{"render", "--gesture", "nothere.csv"}, {"nothere.csv"}},
         {{"render", "--gesture", "bad.csv"}, {"bad.csv:3:"}},
         {{"render", "--gesture", "late.csv"}, {"late.csv:3:"}},
@@ -111,16 +111,11 @@ TEST(KovaCli, FailuresExitOneAndKeepTheOutput) {
         {{"render", "--gesture", "fast", "-o", "no/such/dir/out.wav"}, {"no/such/dir/out.wav"}},
         {{"play", "--gesture", "fast", "--device", no_device}, {"no sound device", "--capture"}},
     };
-    for (const auto& c : cases) {
-        std::vector<std::string> args = c.args;
-        if (args[0] == "render" && args[args.size() - 2] != "-o") {
-            args.insert(args.end(), {"-o", "out.wav"});
+    for (Case c : cases) {
+        if (c.args[0] == "render" && c.args[c.args.size() - 2] != "-o") {
+            c.args.insert(c.args.end(), {"-o", "out.wav"});
         }
-        const RunResult r = run_kova(args, dir.path);
-        SCOPED_TRACE(testing::PrintToString(args));
-        EXPECT_EQ(r.code, 1);
-        EXPECT_EQ(std::count(r.err.begin(), r.err.end(), '\n'), 1) << r.err;
-        for (const std::string& part : c.parts) EXPECT_TRUE(has(r.err, part)) << r.err;
+        expect_run(c, dir, 1);
         EXPECT_EQ(read_file(dir.file("out.wav")), keep);
     }
     EXPECT_EQ(count_files(dir.path), 7u) << "a failed command left a file behind";
