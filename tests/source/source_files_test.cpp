@@ -233,6 +233,13 @@ TEST(HostileFile, CountsAboveTheLimitRefuseTheFileUntouched) {
     for (const char* count : {"\x40\0\0\0", "\x03\0\0\0", "\xfb\xff\xff\xff", "\0\0\0\x80"}) {
         EXPECT_EQ(Probe(b.path, b.with(0, count)).rc, KOVA_OK);  // 64, 3, -5, INT32_MIN read on
     }
+    // The filter query follows any count: the descriptors there are read.
+    Bytes two = b.with(0, "\xe8\x03\0\0");  // 1000 filters, only two of them there
+    two.resize(4 + 2 * 40);
+    write_file(b.path, two);
+    KOVA_FLT_DSC f[4] = {};
+    printed([&] { return kova_get_filters_fromfile(b.path.c_str(), f); }, KOVA_OK);
+    EXPECT_TRUE(f[KOVA_FLT_BANDPASS].freq == 1000.0 && f[KOVA_FLT_LOWPASS].freq == 3000.0);
 }
 
 TEST(HostileFile, BadDescriptorsSizesSlotsRepeatPointsAndRate) {
