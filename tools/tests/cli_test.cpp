@@ -37,15 +37,13 @@ void expect_run(const Case& c, const TempDir& dir, int code) {
     for (const std::string& part : c.parts) EXPECT_TRUE(has(text, part)) << text;
 }
 
-TEST(KovaCli, HelpListsCommandsOptionsAndStartingTuneValues) {
-    const Case cases[] = {
-        {{"render", "--help"},
-         {"built-in   1     0.2   1         0.2       1       1",
-          "--loop     1     0.4   1         0.2       0       0.4       0.6"}},
-        {{"--version"}, {"kova 1."}},
-    };
+TEST(KovaCli, HelpListsStartingTuneValuesAndVersion) {
     TempDir dir;
-    for (const Case& c : cases) expect_run(c, dir, 0);
+    expect_run({{"render", "--help"},
+                {"built-in   1     0.2   1         0.2       1       1",
+                 "--loop     1     0.4   1         0.2       0       0.4       0.6"}},
+               dir, 0);
+    expect_run({{"--version"}, {"kova 1."}}, dir, 0);
 }
 
 /* Exit 2 and one line on standard error naming what was wrong: with every listed part. */
@@ -161,7 +159,6 @@ TEST(KovaPlay, CaptureHoldsEveryBlockWithoutADevice) {
         EXPECT_TRUE(has(r.err, part)) << r.err;
     EXPECT_NE(r.err.find("] "), r.err.rfind("] ")) << "refreshed while it plays";
     EXPECT_TRUE(has(r.out, "no sound device")) << r.out;
-    EXPECT_TRUE(has(r.out, kNoDevice)) << r.out;
     const Wav w = read_wav(dir.file("cap.wav"));
     EXPECT_EQ(w.rate, 48000);
     EXPECT_EQ(w.channels, 2);
