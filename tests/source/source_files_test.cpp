@@ -25,9 +25,6 @@ using Bytes = std::vector<uint8_t>;
 
 using kova_test::TempDir;
 
-void write_file(const std::string& path, const Bytes& b) {
-    std::ofstream(path, std::ios::binary).write(reinterpret_cast<const char*>(b.data()), b.size());
-}
 Bytes read_file(const std::string& path) {
     std::ifstream in(path, std::ios::binary);
     return Bytes(std::istreambuf_iterator<char>(in), {});
@@ -181,11 +178,11 @@ struct Base {
     }
 };
 
-// `bytes` written to `path` and read as a set, checked for what the engine relies on. That every
+// `bytes` written to the folder's file "h" and read as a set, checked for what the engine relies on. That every
 // query answers any file that opens is a property of the set-file fuzzer, checked on every input
 // it replays or makes.
 struct Probe : Read {
-    Probe(const std::string& path, const Bytes& bytes) : Read((write_file(path, bytes), path)) {
+    Probe(const TempDir& t, const Bytes& bytes) : Read(t.write("h", bytes)) {
         EXPECT_LE(set->filters->count, 64u);
         for (NODE* n = set->filters->head->next; n != set->filters->tail; n = n->next) {
             const auto* d = static_cast<KOVA_FLT_DSC*>(n->data);
@@ -205,7 +202,7 @@ TEST(HostileFile, EveryTruncationReadsWhatIsThereAndNothingElse) {
     Base b;
     for (size_t len = 0; len <= b.file.size(); ++len) {
         SCOPED_TRACE(len);
-        const Probe p(b.path, Bytes(b.file.begin(), b.file.begin() + len));
+        const Probe p(b.t, Bytes(b.file.begin(), b.file.begin() + len));
         ASSERT_EQ(p.rc, KOVA_OK);
         // A descriptor cut short counts (zeros where the file ended).
         EXPECT_EQ(p.set->filters->count, len < 4 ? 0 : std::min<size_t>(2, (len + 35) / 40));
@@ -226,17 +223,17 @@ TEST(HostileFile, EveryTruncationReadsWhatIsThereAndNothingElse) {
 TEST(HostileFile, CountsAboveTheLimitRefuseTheFileUntouched) {
     Base b;
     for (const char* count : {"\x41\0\0\0", "\xff\xff\xff\x7f"}) {  // 65, INT32_MAX
-        const Probe p(b.path, b.with(0, count));
+        const Probe p(b.t, b.with(0, count));
         EXPECT_EQ(p.rc, KOVA_ERR_INVALID_PARAM);
         EXPECT_TRUE(p.set->filters->count == 0 && p.set->tune->file_gain == -7 && !p.set->src[1]);
     }
     for (const char* count : {"\x40\0\0\0", "\x03\0\0\0", "\xfb\xff\xff\xff", "\0\0\0\x80"}) {
-        EXPECT_EQ(Probe(b.path, b.with(0, count)).rc, KOVA_OK);  // 64, 3, -5, INT32_MIN read on
+        EXPECT_EQ(Probe(b.t, b.with(0, count)).rc, KOVA_OK);  // 64, 3, -5, INT32_MIN read on
     }
     // The filter query follows any count: the descriptors there are read.
     Bytes two = b.with(0, "\xe8\x03\0\0");  // 1000 filters, only two of them there
     two.resize(4 + 2 * 40);
-    write_file(b.path, two);
+    b.t.write("h", two);
     KOVA_FLT_DSC f[4] = {};
     printed([&] { return kova_get_filters_fromfile(b.path.c_str(), f); }, KOVA_OK);
     EXPECT_TRUE(f[KOVA_FLT_BANDPASS].freq == 1000.0 && f[KOVA_FLT_LOWPASS].freq == 3000.0);
@@ -246,14 +243,14 @@ TEST(HostileFile, BadDescriptorsSizesSlotsRepeatPointsAndRate) {
     Base b;
     // A stored rate of 0 gives the repeat query no duration (no division by zero).
     KOVA_RPT_INFO r{};
-    write_file(b.path, b.with(184, "\0\0\0\0"));
+    b.t.write("h", b.with(184, "\0\0\0\0"));
     ASSERT_EQ(kova_get_rptinfo_fromfile(b.path.c_str(), &r), KOVA_OK);
     EXPECT_EQ(r.len_ms[1], 0);
     Bytes f = b.with(4, "\x04\0\0\0");                  // type 4
     std::memcpy(f.data() + 76, "\x40\x42\x0f\x00", 4);  // 1000000 channels
     std::memcpy(f.data() + kRecord[0] + 32, "\2\0\0\0\0\0\0\0\xfb\xff\xff\xff\x3f\x42\x0f", 16);
     std::memcpy(f.data() + kRecord[2] + 24, "\xff\xff\xff\x7f", 4);  // INT32_MAX bytes
-    const Probe p(b.path, f);
+    const Probe p(b.t, f);
     ASSERT_EQ(p.rc, KOVA_OK);
     EXPECT_EQ(p.set->filters->count, 0u);
     EXPECT_EQ(memcmp(p.set->src[1]->pcm_proc, b.pcm[1].data(), 3000), 0);  // nothing filtered
@@ -263,16 +260,16 @@ TEST(HostileFile, BadDescriptorsSizesSlotsRepeatPointsAndRate) {
     EXPECT_TRUE(start->slot == 2 && start->rpt_start == 0 && start->rpt_end == 1000);
     EXPECT_EQ(p.set->src[2]->size, 500);
     // A negative size names no payload: the slot stays empty. Size 0 is an empty source.
-    EXPECT_EQ(Probe(b.path, b.with(kRecord[0] + 24, "\xff\xff\xff\xff")).set->src[0], nullptr);
-    const Probe empty(b.path, b.with(kRecord[0] + 24, "\0\0\0\0"));
+    EXPECT_EQ(Probe(b.t, b.with(kRecord[0] + 24, "\xff\xff\xff\xff")).set->src[0], nullptr);
+    const Probe empty(b.t, b.with(kRecord[0] + 24, "\0\0\0\0"));
     ASSERT_NE(empty.set->src[0], nullptr);
     EXPECT_EQ(empty.set->src[0]->size, 0);
-    EXPECT_EQ(Probe(b.path, b.with(176, "\2\0\0\0")).set->src[1], nullptr);  // has_src 2: absent
+    EXPECT_EQ(Probe(b.t, b.with(176, "\2\0\0\0")).set->src[1], nullptr);  // has_src 2: absent
     // Oversized payloads are cut at the slot limit and the next record is still found.
     save(make_set({}, tune(0, 0.4), make_src(0, pattern(50000, 4), 0, 50000),
                   make_src(1, pattern(300000, 5), 0, 300000), make_src(2, b.pcm[2], 0, 500)),
          b.path);
-    const Probe big(b.path, read_file(b.path));
+    const Probe big(b.t, read_file(b.path));
     ASSERT_EQ(big.rc, KOVA_OK);
     EXPECT_TRUE(big.set->src[0]->size == 38400 &&
                 !memcmp(big.set->src[0]->pcm, pattern(38400, 4).data(), 38400));
@@ -282,13 +279,12 @@ TEST(HostileFile, BadDescriptorsSizesSlotsRepeatPointsAndRate) {
 
 TEST(FileAccess, PathLimitPositionsAndSize) {
     TempDir t;
-    const std::string dir = t.file(std::string(250, 'd'));
-    std::filesystem::create_directory(dir);
-    const std::string path = dir + "/" + std::string(511 - dir.size() - 1, 'f');  // 511 chars
+    std::filesystem::create_directory(t.file(std::string(250, 'd')));
+    const std::string name =
+        std::string(250, 'd') + "/" + std::string(510 - t.path.size() - 251, 'f');
     const Bytes data = pattern(1000, 2);
-    write_file(path, data);
-    write_file(path + "g", data);
-    EXPECT_EQ(Opened(path + "g", 0).h, nullptr);  // 512 characters: refused though it exists
+    const std::string path = t.write(name, data);                // 511 characters
+    EXPECT_EQ(Opened(t.write(name + "g", data), 0).h, nullptr);  // 512: refused though it exists
     EXPECT_EQ(Opened(t.file("missing"), 0).h, nullptr);
     Opened f(path, 2);  // bit 0 clear: read-only
     ASSERT_NE(f.h, nullptr);
@@ -312,7 +308,7 @@ TEST(FileAccess, WriteOpenCreates0644AndKeepsTheOldTail) {
     struct stat st {};
     ASSERT_EQ(stat(t.file("new").c_str(), &st), 0);
     EXPECT_EQ(st.st_mode & 0777, 0644u);
-    write_file(t.file("old"), Bytes{'A', 'B', 'C', 'D'});
+    t.write("old", Bytes{'A', 'B', 'C', 'D'});
     {
         Opened f(t.file("old"), 1);
         EXPECT_EQ(f.m.write(f.h, "xy", 2), 2);
