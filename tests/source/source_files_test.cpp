@@ -178,9 +178,9 @@ struct Base {
     }
 };
 
-// `bytes` written to the folder's file "h" and read as a set, checked for what the engine relies on. That every
-// query answers any file that opens is a property of the set-file fuzzer, checked on every input
-// it replays or makes.
+// `bytes` written to the folder's file "h" and read as a set, checked for what the engine relies
+// on. That every query answers any file that opens is a property of the set-file fuzzer, checked on
+// every input it replays or makes.
 struct Probe : Read {
     Probe(const TempDir& t, const Bytes& bytes) : Read(t.write("h", bytes)) {
         EXPECT_LE(set->filters->count, 64u);
