@@ -153,8 +153,7 @@ Json inspect(const TempDir& dir, const std::string& file) {
 TEST(KovaSaveInspect, JsonShowsWhatWasSaved) {
     TempDir dir;
     write_file(dir.file("set.kset"), std::string(400000, 'x'));
-    const RunResult r = run_kova(kSaveArgs, dir.path);
-    ASSERT_EQ(r.code, 0) << r.err;
+    ASSERT_EQ(run_kova(kSaveArgs, dir.path).code, 0);
     const Json j = inspect(dir, "set.kset");
 
     const int first = kCount + 2 * kFilter + kTune + kInfo + kRecord;
