@@ -1,6 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Format check, context creation and release; tune-set range rules and pairs, thickness and
-// volume controls.
+// Format check, context creation and release; tune-set range rules and pairs.
 #include <gtest/gtest.h>
 
 #include <cmath>
@@ -64,24 +63,6 @@ TEST(TuneTest, SetTakesOnlyValuesInRange) {
     EXPECT_EQ(kova_set_tuneset(ctx.get(), 1, &in), KOVA_OK);
     EXPECT_EQ(tune_values(t),
               (std::vector<double>{0.5, 0.5, 0, 1.0, 0, 0.7, 0.5, 0.5, 0.5, 0.5, 0.5}));
-}
-
-TEST(TuneTest, ThicknessAndVolume) {
-    kova_test::CtxPtr ctx = kova_test::make_ctx();
-    EXPECT_EQ(kova_set_thickness(ctx.get(), 1.0), KOVA_OK);  // no set yet: no effect
-    EXPECT_EQ(ctx->eq->low_gain, 1.0);
-
-    kova_test::TempDir dir;
-    KOVA_SRCSET* set = kova_test::reg_files(ctx.get(), dir, {{}, {1, 2}, {}});
-    EXPECT_EQ(kova_set_thickness(ctx.get(), 1.0), KOVA_OK);
-    EXPECT_EQ(set->thickness, 1.0);
-    EXPECT_EQ(ctx->eq->low_gain, 1.2);
-    EXPECT_EQ(ctx->eq->slew_decay, 1.0);
-
-    // 0.5 gives 0.4 through the Java method (Methods.TuningThicknessAndVolumeReachTheEngine);
-    // above 1 is taken too.
-    EXPECT_EQ(kova_set_volume(ctx.get(), 2.0), KOVA_OK);
-    EXPECT_EQ(ctx->volume, 1.6);
 }
 
 }  // namespace

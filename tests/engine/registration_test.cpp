@@ -103,33 +103,6 @@ TEST(Registration, NonRegularFilesAreRefusedWithoutBlocking) {
     EXPECT_TRUE(S_ISFIFO(st.st_mode));
 }
 
-TEST(Registration, LoopPathDecidesWhetherASetExists) {
-    kova_test::TempDir dir;
-    auto e = kova_test::make_ctx();
-    const std::string start = dir.write("s.pcm", kova_test::varied(400)),
-                      loop = dir.write("l.pcm", kova_test::varied(4000)),
-                      end = dir.write("e.pcm", kova_test::varied(400)), missing = dir.file("none");
-    int32_t err = 0;
-    const char* no_loop[3] = {start.c_str(), nullptr, end.c_str()};
-    EXPECT_EQ(kova_reg_src_byfiles(e.get(), no_loop, &err), 0);
-    EXPECT_EQ(err, KOVA_ERR_SOURCE);
-    const char* bad_loop[3] = {start.c_str(), missing.c_str(), end.c_str()};
-    EXPECT_EQ(kova_reg_src_byfiles(e.get(), bad_loop, &err), 0);
-    EXPECT_EQ(err, KOVA_ERR_SOURCE);
-    EXPECT_EQ(kova_get_src_num(e.get()), 0);
-    EXPECT_EQ(e.get()->active_src, 0);
-
-    const char* only_loop[3] = {nullptr, loop.c_str(), nullptr};
-    ASSERT_EQ(kova_reg_src_byfiles(e.get(), only_loop, &err), 1);
-    EXPECT_EQ(err, KOVA_OK);
-    const KOVA_SRCSET* set = set_of(e.get(), 1);
-    EXPECT_EQ(set->src[KOVA_SLOT_START], nullptr);
-    EXPECT_EQ(set->src[KOVA_SLOT_END], nullptr);
-    ASSERT_EQ(set->src[KOVA_SLOT_LOOP]->size, 8000);
-    EXPECT_EQ(0, memcmp(set->src[KOVA_SLOT_LOOP]->pcm, set->src[KOVA_SLOT_LOOP]->pcm_proc, 8000));
-    // That empty start and end slots play nothing is GenTest.StartAndEndSlots.
-}
-
 /* Identifiers count up from 1 over all three ways of registering, the newest set becomes the
  * active one, and the twenty-first (a saved file may take it) is the last. */
 TEST(Registration, IdentifiersLimitsAndSelection) {
