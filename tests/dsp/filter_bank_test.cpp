@@ -78,6 +78,20 @@ TEST(Noise, TenthOfFullScaleOneDrawPerSampleNeverSeeded) {
     EXPECT_EQ(five[2], 7);
 }
 
+TEST(Noise, SourcesPerSlot) {
+    KOVA_FLT_DSC d = flt(0, 1000);
+    const int32_t sizes[] = {38400, 192000, 38400};
+    for (uint32_t slot = 0; slot < 3; ++slot) {
+        int32_t err = 99;
+        KOVA_SRC* s = kova_gen_sound_source_wn(&d, slot, &err);
+        ASSERT_NE(s, nullptr);
+        EXPECT_EQ(err, KOVA_OK);
+        EXPECT_EQ(s->size, sizes[slot]);
+        EXPECT_EQ(std::memcmp(s->pcm, s->pcm_proc, s->size), 0);
+        kova_free_sourceobj(s);
+    }
+}
+
 TEST(FilterBank, ParallelBranchesAveragedWithTruncation) {
     Pcm in = noise(4000);
     KOVA_FLT_DSC lp = flt(KOVA_FLT_LOWPASS, 1000), hp = flt(KOVA_FLT_HIGHPASS, 3000),

@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// Format check, context creation and release; tune-set range rules and pairs.
+// Format check, context creation and release; tune-set range rules and pairs, a thickness
+// without a set.
 #include <gtest/gtest.h>
 
 #include <cmath>
@@ -49,6 +50,8 @@ TEST(ContextTest, FormatRules) {
 TEST(TuneTest, SetTakesOnlyValuesInRange) {
     kova_test::TempDir dir;
     kova_test::CtxPtr ctx = kova_test::make_ctx();
+    EXPECT_EQ(kova_set_thickness(ctx.get(), 1.0), KOVA_OK);  // no set yet: no effect
+    EXPECT_EQ(ctx->eq->low_gain, 1.0);
     KOVA_TUNE_SET& t = *kova_test::reg_files(ctx.get(), dir, {{}, {1, 2}, {}})->tune;
 
     // gain out of range, pan taken; oscillator on with a bad depth: neither changes; sharpness

@@ -225,7 +225,7 @@ TEST_F(GenTest, NonFiniteCoordinatesAreEvents) {
 // bit for bit against the documented order (equaliser, then the pan gain on the finished sample):
 // a short one, then a long one (the equaliser on lanes, in two pieces) twice over, each call
 // going on from the equaliser state the one before left, the last far off the screen, where
-// panned samples pass the 32-bit range. Then a constant 10000 at both edges.
+// panned samples pass the 32-bit range.
 TEST_F(GenTest, PanGainsFollowPosition) {
     KOVA_EQ eq;
     kova_eq_init(&eq, 880, 5000, 48000);
@@ -242,16 +242,6 @@ TEST_F(GenTest, PanGainsFollowPosition) {
             const auto s = static_cast<int16_t>(
                 kova_eq_proc(&eq, static_cast<int32_t>(1.0 * 0.6 * 0.8 * 0.4 * start[i])));
             ASSERT_EQ(buf[i], static_cast<int16_t>(sat32(s * pan[i % 2]))) << i;
-        }
-    }
-    kova_test::reg_files(ctx.get(), dir, {std::vector<int16_t>(400, 10000), loop, {}});
-    const float xs[2] = {0.0f, 1080.0f};
-    for (float x : xs) {
-        ASSERT_EQ(gen(ctx.get(), event(x, 5, 1000, KOVA_ACTION_START), buf), 800);
-        const double left = x == 0 ? 1.0 : 0.6, right = x == 0 ? 0.6 : 1.0;
-        for (int i = 100; i < 400; i += 2) {  // the equaliser has settled
-            EXPECT_NEAR(buf[static_cast<size_t>(i)], 1920 * left, 1.0);
-            EXPECT_NEAR(buf[static_cast<size_t>(i) + 1], 1920 * right, 1.0);
         }
     }
 }

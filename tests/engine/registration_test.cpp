@@ -128,13 +128,12 @@ TEST(Registration, IdentifiersLimitsAndSelection) {
     EXPECT_EQ(kova_get_src_num(e.get()), 21);
     EXPECT_EQ(e.get()->active_src, 21);
 
-    // Selecting applies the set's thickness to the equaliser.
-    kova_set_thickness(e.get(), 0.9);  // set 21 now has thickness 0.9, set 1 keeps 0.6
-    EXPECT_EQ(kova_set_active_src(e.get(), 1), KOVA_OK);
+    // A thickness goes to the active set and the equaliser; selecting applies the set's own.
     KOVA_EQ ref;
     kova_eq_init(&ref, 880, 5000, 48000);
-    kova_eq_set_thickness(&ref, 0.6);
-    EXPECT_EQ(e.get()->eq->mid_gain, ref.mid_gain);
-    EXPECT_EQ(e.get()->eq->slew_decay, ref.slew_decay);
+    kova_set_thickness(e.get(), 0.9);  // set 21 now has thickness 0.9, set 1 keeps 0.6
+    EXPECT_EQ(e.get()->eq->low_gain, kova_eq_set_thickness(&ref, 0.9)->low_gain);
+    EXPECT_EQ(kova_set_active_src(e.get(), 1), KOVA_OK);
+    EXPECT_EQ(e.get()->eq->slew_decay, kova_eq_set_thickness(&ref, 0.6)->slew_decay);
     EXPECT_EQ(e.get()->active_src, 1);
 }
