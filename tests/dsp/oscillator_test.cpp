@@ -57,7 +57,6 @@ TEST(Oscillator, WaveformsAtKnownPhases) {
     kova_osc_set_freq(sine, 6000.0);
     std::vector<double> s = take(sine, 8);
     for (int k = 0; k < 8; ++k) EXPECT_NEAR(s[k], std::sin(k * M_PI / 4), 1e-15) << k;
-    EXPECT_EQ(s[0], 0.0);
 
     KOVA_OSC* stereo = kova_osc_init(48000, 2, 2);  // each value handed out twice
     kova_osc_set_freq(stereo, 6000.0);

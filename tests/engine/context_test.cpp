@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// Format check, context creation and release; tune-set range rules and pairs, thickness and
-// volume controls.
+// Format check, context creation and release; tune-set range rules and pairs, a thickness
+// without a set.
 #include <gtest/gtest.h>
 
 #include <cmath>
@@ -27,29 +27,27 @@ TEST(ContextTest, FormatRules) {
         {{48000, 2, 1, 1080, 0}, -1},
     };
     for (const Case& c : cases) {
-        SCOPED_TRACE(testing::Message() << c.f.sample_rate << "/" << c.f.channels << "/" << c.f.p
-                                        << "/" << c.f.w << "/" << c.f.h);
-        EXPECT_EQ(kova_checkformat(&c.f), c.want);
+        EXPECT_EQ(kova_checkformat(&c.f), c.want) << c.f.sample_rate << "/" << c.f.channels << "/"
+                                                  << c.f.p << "/" << c.f.w << "/" << c.f.h;
+    }
+    // That kova_init fails only where the check refuses is checked on every input of the
+    // generation fuzz corpus; here what it reports: nothing and KOVA_OK, or the code and a line.
+    for (const Case& c : {cases[0], cases[1]}) {
         int32_t err = 7;
         testing::internal::CaptureStdout();
-        KOVA_CTX* ctx = kova_init(&c.f, &err);
-        const std::string out = testing::internal::GetCapturedStdout();
-        if (c.want == 1) {
-            ASSERT_NE(ctx, nullptr);
-            EXPECT_EQ(err, KOVA_OK);
-            EXPECT_EQ(out, "");
-            EXPECT_EQ(kova_deinit(ctx), KOVA_OK);
-        } else {
-            EXPECT_EQ(ctx, nullptr);
-            EXPECT_EQ(err, KOVA_ERR_INVALID_FORMAT);
-            EXPECT_EQ(out, "kova_init() fail. err code (-1) \n");
-        }
+        const kova_test::CtxPtr ctx(kova_init(&c.f, &err));
+        EXPECT_EQ(testing::internal::GetCapturedStdout(),
+                  c.want == 1 ? "" : "kova_init() fail. err code (-1) \n");
+        EXPECT_EQ(err, c.want == 1 ? KOVA_OK : KOVA_ERR_INVALID_FORMAT);
+        EXPECT_EQ(ctx != nullptr, c.want == 1);
     }
 }
 
 TEST(TuneTest, SetTakesOnlyValuesInRange) {
     kova_test::TempDir dir;
     kova_test::CtxPtr ctx = kova_test::make_ctx();
+    EXPECT_EQ(kova_set_thickness(ctx.get(), 1.0), KOVA_OK);  // no set yet: no effect
+    EXPECT_EQ(ctx->eq->low_gain, 1.0);
     KOVA_TUNE_SET& t = *kova_test::reg_files(ctx.get(), dir, {{}, {1, 2}, {}})->tune;
 
     // gain out of range, pan taken; oscillator on with a bad depth: neither changes; sharpness
@@ -64,24 +62,6 @@ TEST(TuneTest, SetTakesOnlyValuesInRange) {
     EXPECT_EQ(kova_set_tuneset(ctx.get(), 1, &in), KOVA_OK);
     EXPECT_EQ(tune_values(t),
               (std::vector<double>{0.5, 0.5, 0, 1.0, 0, 0.7, 0.5, 0.5, 0.5, 0.5, 0.5}));
-}
-
-TEST(TuneTest, ThicknessAndVolume) {
-    kova_test::CtxPtr ctx = kova_test::make_ctx();
-    EXPECT_EQ(kova_set_thickness(ctx.get(), 1.0), KOVA_OK);  // no set yet: no effect
-    EXPECT_EQ(ctx->eq->low_gain, 1.0);
-
-    kova_test::TempDir dir;
-    KOVA_SRCSET* set = kova_test::reg_files(ctx.get(), dir, {{}, {1, 2}, {}});
-    EXPECT_EQ(kova_set_thickness(ctx.get(), 1.0), KOVA_OK);
-    EXPECT_EQ(set->thickness, 1.0);
-    EXPECT_EQ(ctx->eq->low_gain, 1.2);
-    EXPECT_EQ(ctx->eq->slew_decay, 1.0);
-
-    // 0.5 gives 0.4 through the Java method (Methods.TuningThicknessAndVolumeReachTheEngine);
-    // above 1 is taken too.
-    EXPECT_EQ(kova_set_volume(ctx.get(), 2.0), KOVA_OK);
-    EXPECT_EQ(ctx->volume, 1.6);
 }
 
 }  // namespace

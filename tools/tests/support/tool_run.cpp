@@ -1,100 +1,55 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "support/tool_run.h"
 
-#include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sndfile.h>
-#include <spawn.h>
 #include <sys/wait.h>
-#include <unistd.h>
 
+#include <chrono>
 #include <cmath>
-#include <csignal>
-#include <ctime>
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
 #include <sstream>
 
-extern char** environ;
-
 namespace kova_test {
 
 namespace {
 
-int64_t now_ms() {
-    timespec t{};
-    clock_gettime(CLOCK_MONOTONIC, &t);
-    return t.tv_sec * 1000LL + t.tv_nsec / 1000000;
-}
-
-/* Waits for `pid`, sending SIGINT at `sigint_at` (monotonic ms, 0: never); returns the status and
- * the time from the signal to the exit. */
-int wait_child(pid_t pid, int64_t sigint_at, int64_t& exit_ms) {
-    int status = 0;
-    int64_t sent = 0;
-    while (waitpid(pid, &status, sigint_at ? WNOHANG : 0) == 0) {
-        const int64_t now = now_ms();
-        if (!sent && now >= sigint_at) kill(pid, SIGINT), sent = now;
-        if (sent && now - sent > 10000) kill(pid, SIGKILL);
-        usleep(5000);
-    }
-    if (sent) exit_ms = now_ms() - sent;
-    return status;
-}
-
-/* Pointers to the strings, null-terminated, as exec takes them. */
-std::vector<char*> c_strings(std::vector<std::string>& strings) {
-    std::vector<char*> p;
-    for (std::string& s : strings) p.push_back(s.data());
-    p.push_back(nullptr);
-    return p;
+/* `s` in single quotes, for the shell. */
+std::string shell_word(const std::string& s) {
+    std::string q = "'";
+    for (char c : s) q += c == '\'' ? std::string("'\\''") : std::string(1, c);
+    return q + "'";
 }
 
 }  // namespace
 
+/* Through the shell: coreutils' timeout sends the signal (and SIGKILL 10 s later) and passes the
+ * tool's exit code on; script(1) gives standard error a terminal and copies what it got. */
 RunResult run_kova(const std::vector<std::string>& args, const std::string& dir,
                    int sigint_after_ms, const std::vector<std::string>& env, bool stderr_tty) {
-    const std::string out_path = dir + "/.stdout";
-    const std::string err_path = dir + "/.stderr";
-    std::vector<std::string> argv_store{KOVA_TOOL_BINARY};
-    argv_store.insert(argv_store.end(), args.begin(), args.end());
-    const std::vector<char*> argv = c_strings(argv_store);
-
-    posix_spawn_file_actions_t fa;
-    posix_spawn_file_actions_init(&fa);
-    posix_spawn_file_actions_addopen(&fa, 0, "/dev/null", O_RDONLY, 0);
-    posix_spawn_file_actions_addopen(&fa, 1, out_path.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
-    const int pty = stderr_tty ? posix_openpt(O_RDWR | O_NOCTTY) : -1;
-    if (pty >= 0 && grantpt(pty) == 0 && unlockpt(pty) == 0) {
-        posix_spawn_file_actions_addopen(&fa, 2, ptsname(pty), O_WRONLY | O_NOCTTY, 0);
-    } else {
-        posix_spawn_file_actions_addopen(&fa, 2, err_path.c_str(), O_WRONLY | O_CREAT | O_TRUNC,
-                                         0644);
-    }
-    posix_spawn_file_actions_addchdir_np(&fa, dir.c_str());
-    std::vector<std::string> env_store(env);
-    for (char** e = environ; *e; ++e) env_store.emplace_back(*e);
-    const std::vector<char*> envp = c_strings(env_store);
-    pid_t pid = -1;
+    std::string cmd = "env";
+    for (const std::string& e : env) cmd += " " + shell_word(e);
+    if (sigint_after_ms > 0)
+        cmd += " timeout --preserve-status -k 10 -s INT " + std::to_string(sigint_after_ms / 1e3);
+    cmd += " " + shell_word(KOVA_TOOL_BINARY);
+    for (const std::string& a : args) cmd += " " + shell_word(a);
+    cmd += " </dev/null >.stdout";
+    cmd = stderr_tty ? "script -qefc " + shell_word(cmd) + " /dev/null </dev/null >.stderr"
+                     : cmd + " 2>.stderr";
+    const auto start = std::chrono::steady_clock::now();
+    const int status = std::system(("cd " + shell_word(dir) + " && " + cmd).c_str());
+    const auto ms = std::chrono::duration_cast<std::chrono::milliseconds>(
+                        std::chrono::steady_clock::now() - start)
+                        .count();
     RunResult r;
-    const int64_t start = now_ms();
-    const int rc = posix_spawn(&pid, argv[0], &fa, nullptr, argv.data(), envp.data());
-    posix_spawn_file_actions_destroy(&fa);
-    if (rc != 0) {
-        ADD_FAILURE() << "cannot start " << argv[0];
-        return r;
-    }
-    const int status = wait_child(pid, sigint_after_ms ? start + sigint_after_ms : 0, r.exit_ms);
     if (WIFEXITED(status)) r.code = WEXITSTATUS(status);
-    r.out = read_file(out_path);
-    r.err = read_file(err_path);
-    // What the terminal got stays readable after the child closed its side.
-    char buf[4096];
-    for (ssize_t n; pty >= 0 && (n = read(pty, buf, sizeof buf)) > 0;) r.err.append(buf, n);
-    if (pty >= 0) close(pty);
-    unlink(out_path.c_str());
-    unlink(err_path.c_str());
+    if (sigint_after_ms > 0) r.exit_ms = ms - sigint_after_ms;
+    r.out = read_file(dir + "/.stdout");
+    r.err = read_file(dir + "/.stderr");
+    std::filesystem::remove(dir + "/.stdout");
+    std::filesystem::remove(dir + "/.stderr");
     return r;
 }
 
@@ -104,8 +59,7 @@ std::string read_file(const std::string& path) {
 }
 
 void write_file(const std::string& path, const std::string& bytes) {
-    std::ofstream f(path, std::ios::binary | std::ios::trunc);
-    f << bytes;
+    std::ofstream(path, std::ios::binary | std::ios::trunc) << bytes;
 }
 
 size_t count_files(const std::string& dir) {
@@ -116,11 +70,13 @@ bool has(const std::string& text, const std::string& part) {
     return text.find(part) != std::string::npos;
 }
 
-int count_lines(const std::string& text) {
-    int n = 0;
-    std::istringstream in(text);
-    for (std::string line; std::getline(in, line);) n += !line.empty();
-    return n;
+std::string stroke_csv(int t0, int last_ms, int y, bool to_and_fro) {
+    std::ostringstream s;
+    s << t0 << ",down,100," << y << "\n";
+    for (int t = t0 + 10; t <= last_ms; t += 10)
+        s << t << ",move," << 100 + (to_and_fro ? t / 10 % 2 * 10 : t - t0) << "," << y << "\n";
+    if (!to_and_fro) s << last_ms + 10 << ",up,300," << y << "\n";
+    return s.str();
 }
 
 void write_tone(const std::string& path, int format, int rate, int channels, double seconds) {

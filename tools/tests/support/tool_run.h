@@ -29,9 +29,10 @@ std::string read_file(const std::string& path);
 void write_file(const std::string& path, const std::string& bytes);
 /* Files in the folder, hidden ones included. */
 size_t count_files(const std::string& dir);
-/* Lines of `text` that are not empty. */
-int count_lines(const std::string& text);
 bool has(const std::string& text, const std::string& part);
+/* CSV rows of a stroke: down at `t0` at (100, y), a move every 10 ms up to `last_ms`, straight on
+ * at 1 px/ms and then up, or to and fro by 10 px and never lifted. */
+std::string stroke_csv(int t0, int last_ms, int y, bool to_and_fro = false);
 
 struct Wav {
     int rate = 0;
