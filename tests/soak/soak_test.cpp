@@ -6,6 +6,8 @@
 // Checked:
 //   - each device received exactly the blocks its instance generated, in order (compared
 //     whenever the stream was drained), so no block was lost, refused for lack of room or padded;
+//   - no underrun while the producer keeps up: during a stroke whose events all came within
+//     kKeepUp of each other, the stream still held a device burst ahead of every event;
 //   - no per-event or per-stroke allocation: the library allocates only while registering
 //     (allocation counter); LeakSanitizer checks that what it allocated is given back.
 // Length: KOVA_SOAK_SECONDS (default 3; CI runs 20).
@@ -16,6 +18,8 @@
 #include <random>
 
 #include "jni/jni_test_support.h"
+#include "kova/android/kova_fasttrack.h"
+#include "kova/kova_output.h"
 #include "kova_host/audio_sink.h"
 #include "util/kova_mem.h"
 
@@ -26,6 +30,9 @@ using namespace std::chrono_literals;
 
 constexpr int kInstances = 4;
 constexpr auto kEventGap = 8ms;
+// The start sound (200 ms) queues ahead of the moves; a producer that is never later than this
+// between two events keeps the stream from running dry.
+constexpr auto kKeepUp = 100ms;
 // One burst of the host device: 4 ms of 48 kHz stereo.
 constexpr uint32_t kBurstBytes = 192 * 2 * 2;
 constexpr uint32_t kSlotBytes[3] = {38400, 192000, 38400};
@@ -61,9 +68,10 @@ int soak_seconds() {
 std::mutex g_register_lock;
 std::atomic<unsigned long> g_register_allocs{0};
 
-// Per producer: events, strokes, drains, drains where the device content differed from the
-// generated blocks, registrations, bytes generated.
-enum Count { kEvents, kStrokes, kDrains, kDiffer, kRegs, kBytes };
+// Per producer: events, strokes, moments the stream held less than a burst while the producer
+// kept up, drains, drains where the device content differed from the generated blocks,
+// registrations, bytes generated.
+enum Count { kEvents, kStrokes, kThin, kDrains, kDiffer, kRegs, kBytes };
 using Counts = std::array<unsigned long, kBytes + 1>;
 
 class Producer {
@@ -121,6 +129,14 @@ class Producer {
    private:
     static KovaInstance* instance(jlong id) { return pKOVAInfo[id - 1].pInstance; }
     jint num_sets() { return JAVA(get_1src_1num, id_); }
+    // Bytes the stream holds (its device thread drains it under the stream's lock).
+    uint32_t queued() {
+        KOVA_FASTTRACK* ft = inst_->pFastTrack;
+        pthread_mutex_lock(ft->pMutex);
+        const uint32_t n = kova_ringbuffer_read_space(ft->pRing);
+        pthread_mutex_unlock(ft->pMutex);
+        return n;
+    }
 
     // One event through the Java entry point; the block it generated is what the device must
     // receive next.
@@ -141,10 +157,18 @@ class Producer {
         event(x, y, KOVA_ACTION_START);
         const int moves = 40 + static_cast<int>(rng_() % 150);
         float vx = static_cast<float>(3 + rng_() % 30), vy = static_cast<float>(3 + rng_() % 30);
+        bool kept_up = true;
+        auto last = Clock::now();
         for (int i = 0; i <= moves; ++i) {
             next += kEventGap;
             std::this_thread::sleep_until(next);
-            next = std::max(next, Clock::now());  // a late producer resumes its pace, no burst
+            const auto now = Clock::now();
+            next = std::max(next, now);  // a late producer resumes its pace, no burst
+            kept_up = kept_up && now - last <= kKeepUp;
+            last = now;
+            // The stream only drains between two writes, so ahead of every event it must still
+            // hold audio.
+            if (kept_up && queued() < kBurstBytes) ++counts[kThin];
             if (i % 25 == 0) vx = -vx;
             x = std::clamp(x + vx, 0.0f, 1079.0f);
             y = std::clamp(y + vy, 0.0f, 2279.0f);
@@ -210,6 +234,7 @@ TEST(Soak, InstancesStreamStrokesWithoutLossOrGrowth) {
     for (const auto& p : producers) {
         const Counts& c = p->counts;
         EXPECT_EQ(c[kDiffer], 0u) << "device content differs from the generated blocks";
+        EXPECT_EQ(c[kThin], 0u) << "stream ran dry while the producer kept up";
         EXPECT_GT(c[kBytes], 0u);
         for (size_t k = 0; k < total.size(); ++k) total[k] += c[k];
     }
