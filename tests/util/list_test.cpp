@@ -57,7 +57,13 @@ TEST(List, GetatKeepsInBoundsAndInsertsAtSentinelsAppendOrPrepend) {
 }
 
 TEST(List, RemovalsTakeElementsNeverSentinels) {
-    LIST* l = list_of({0, 1, 2, 3, 4});
+    LIST* l = list_create();  // an empty list gives up neither sentinel
+    EXPECT_EQ(remove_node(l, l->head), nullptr);
+    EXPECT_EQ(remove_node(l, l->tail), nullptr);
+    EXPECT_EQ(l->count, 0u);
+    list_destory(l, nullptr);
+
+    l = list_of({0, 1, 2, 3, 4});
     NODE* first = remove_node(l, l->head);
     NODE* last = remove_node(l, l->tail);
     EXPECT_EQ(value(first), 0);
