@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
-// Heap accounting for the benchmarks: a malloc interposer that counts every allocation made by
-// the calling thread (whoever makes it: the library, the C++ runtime, a peer library), and the
-// allocator's own live-byte figure.
+// Heap accounting for the benchmarks and the leak suite: a malloc interposer that counts every
+// allocation made by the calling thread (whoever makes it: the library, the C++ runtime, a peer
+// library), and the allocator's own live-byte figure.
 #ifndef KOVA_BENCH_ALLOC_COUNT_H
 #define KOVA_BENCH_ALLOC_COUNT_H
 

@@ -3,9 +3,9 @@
 // lifecycles run many times over: a failure is reported with the documented code, leaves what
 // existed intact, and gives back every byte. The heap in use is measured around each run (plain
 // builds); under AddressSanitizer LeakSanitizer and under valgrind its leak check do the
-// accounting. CI runs this binary under valgrind --leak-check=full.
+// accounting. CI runs this binary under valgrind --leak-check=full. The live bytes come from the
+// benchmarks' counting malloc, which the sanitizer builds leave out.
 #include <gtest/gtest.h>
-#include <malloc.h>
 
 #include <atomic>
 #include <algorithm>
@@ -13,60 +13,10 @@
 #include <string>
 #include <thread>
 
+#include "alloc_count.h"
 #include "jni/jni_test_support.h"
 #include "kova/kova.h"
 #include "util/kova_mem.h"
-
-#if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
-#define KOVA_SANITIZED_HEAP 1
-#elif defined(__has_feature)
-#if __has_feature(address_sanitizer) || __has_feature(thread_sanitizer)
-#define KOVA_SANITIZED_HEAP 1
-#endif
-#endif
-
-namespace {
-// Live bytes; stays 0 under the sanitizers, whose allocators keep their own books.
-std::atomic<long long> g_live_bytes{0};
-}  // namespace
-
-#ifndef KOVA_SANITIZED_HEAP
-// Plain builds: this binary's own malloc family counts the bytes that are live, process-wide and
-// exactly (the allocator's statistics count freed blocks held in per-thread caches as used).
-// Each call forwards to the C library's allocator.
-extern "C" {
-void* __libc_malloc(size_t);
-void* __libc_calloc(size_t, size_t);
-void* __libc_realloc(void*, size_t);
-void __libc_free(void*);
-}
-
-namespace {
-void* counted(void* p) {
-    if (p != nullptr) g_live_bytes += static_cast<long long>(malloc_usable_size(p));
-    return p;
-}
-}  // namespace
-
-extern "C" {
-void* malloc(size_t n) {
-    return counted(__libc_malloc(n));
-}
-void* calloc(size_t n, size_t size) {
-    return counted(__libc_calloc(n, size));
-}
-void free(void* p) {
-    if (p != nullptr) g_live_bytes -= static_cast<long long>(malloc_usable_size(p));
-    __libc_free(p);
-}
-void* realloc(void* p, size_t n) {
-    const long long old = p != nullptr ? static_cast<long long>(malloc_usable_size(p)) : 0;
-    void* q = __libc_realloc(p, n);
-    if (q != nullptr || n == 0) g_live_bytes -= old;  // moved, resized or freed
-    return counted(q);
-}
-}
-#endif
 
 namespace {
 
@@ -100,8 +50,11 @@ auto failing_at(long n, F call) {
 
 // A device thread slow to end (on a loaded machine) frees its state only after the close: waits a
 // little for the live bytes to come back to `heap`.
-void settle(long long heap) {
-    for (int i = 0; i < 500 && g_live_bytes != heap; ++i) std::this_thread::sleep_for(1ms);
+size_t live() {  // 0 where the sanitizers' malloc keeps the books
+    return kova_bench::alloc_counting_enabled() ? kova_bench::heap_bytes_in_use() : 0;
+}
+void settle(size_t heap) {
+    for (int i = 0; i < 500 && live() != heap; ++i) std::this_thread::sleep_for(1ms);
 }
 
 // Sweeps n = 0, 1, ... until a run never reached its n-th allocation; each run must give back
@@ -122,11 +75,11 @@ void sweep(const Op& op) {
     run(-1);  // warm-up: one-time allocations of the C library, the log and the capture
     for (long n = 0; n < 500; ++n) {
         SCOPED_TRACE(std::string(op.what) + ", allocation " + std::to_string(n) + " failing");
-        const long long heap = g_live_bytes.load();
+        const size_t heap = live();
         const unsigned long before = kova_mem_alloc_count();
         run(n);
         settle(heap);
-        EXPECT_EQ(g_live_bytes.load(), heap) << "bytes not given back";
+        EXPECT_EQ(live(), heap) << "bytes not given back";
         if (kova_mem_alloc_count() - before <= static_cast<unsigned long>(n)) {
             EXPECT_GE(n, op.min_allocs);
             return;
