@@ -1,13 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "fuzz_support.h"
 
-#include <fcntl.h>
 #include <sanitizer/asan_interface.h>  // the poisoning macros do nothing without ASan
 #include <unistd.h>
 
 #include <algorithm>
 #include <cstdio>
 #include <cstdlib>
+#include <filesystem>
 #include <fstream>
 #include <iterator>
 
@@ -20,23 +20,9 @@ void fail(const char* what, const char* file, int line) {
     std::abort();
 }
 
-namespace {
-
-// Scratch files live in memory where possible: on disk, rewriting a file per input costs more
-// in the kernel than the library's work on it.
-std::string scratch_dir() {
-    const char* dir = std::getenv("KOVA_FUZZ_SCRATCH");
-    if (dir != nullptr && *dir != '\0') return dir;
-    if (access("/dev/shm", W_OK | X_OK) == 0) return "/dev/shm";
-    const char* tmp = std::getenv("TMPDIR");
-    return tmp != nullptr && *tmp != '\0' ? tmp : "/tmp";
-}
-
-}  // namespace
-
 ScratchFile::ScratchFile(const char* tag) {
-    static const std::string dir = scratch_dir();
-    path_ = dir + "/kova-fuzz-" + std::to_string(getpid()) + "-" + tag;
+    path_ = std::filesystem::temp_directory_path() /
+            ("kova-fuzz-" + std::to_string(getpid()) + "-" + tag);
 }
 
 void ScratchFile::remove() const {
@@ -44,17 +30,9 @@ void ScratchFile::remove() const {
 }
 
 void ScratchFile::rewrite(const void* data, size_t size) const {
-    // Overwrite, then cut: pages a same-sized file already has are reused, not freed and
-    // zeroed again.
-    const int fd = open(path_.c_str(), O_WRONLY | O_CREAT, 0600);
-    FUZZ_CHECK(fd >= 0);
-    const auto* p = static_cast<const uint8_t*>(data);
-    for (ssize_t n = 0; size > 0; p += n, size -= static_cast<size_t>(n)) {
-        n = write(fd, p, size);
-        FUZZ_CHECK(n > 0);
-    }
-    FUZZ_CHECK(ftruncate(fd, lseek(fd, 0, SEEK_CUR)) == 0);
-    close(fd);
+    std::ofstream out(path_, std::ios::binary | std::ios::trunc);
+    out.write(static_cast<const char*>(data), static_cast<std::streamsize>(size));
+    FUZZ_CHECK(out.good());
 }
 
 std::string ScratchFile::read() const {

@@ -47,9 +47,9 @@ class Bytes {
     size_t left_;
 };
 
-// A file on memory-backed storage (KOVA_FUZZ_SCRATCH, else /dev/shm, else TMPDIR or /tmp),
+// A file in the temporary directory (TMPDIR; the fuzz script points it at memory-backed storage),
 // unique to this process and `tag`, removed when the object goes away. rewrite() replaces the
-// whole content in place (no truncation to 0 and regrowth: the file is cut to the new size).
+// whole content.
 class ScratchFile {
    public:
     explicit ScratchFile(const char* tag);

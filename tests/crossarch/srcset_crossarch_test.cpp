@@ -15,7 +15,6 @@
 #include <cstring>
 #include <filesystem>
 #include <fstream>
-#include <iterator>
 #include <string>
 #include <vector>
 
@@ -99,10 +98,7 @@ Bytes expected_file(int32_t origin) {
     return b;
 }
 
-Bytes read_file(const std::string& path) {
-    std::ifstream in(path, std::ios::binary);
-    return Bytes(std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>());
-}
+const auto read_file = kova_test::read_file<Bytes>;
 
 class CrossArch : public testing::Test {
    protected:

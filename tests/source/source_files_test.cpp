@@ -11,7 +11,6 @@
 #include <cstring>
 #include <filesystem>
 #include <functional>
-#include <fstream>
 
 #include "kova/kova_dsp.h"
 #include "kova/kova_list.h"
@@ -24,11 +23,8 @@ namespace {
 using Bytes = std::vector<uint8_t>;
 
 using kova_test::TempDir;
+const auto read_file = kova_test::read_file<Bytes>;
 
-Bytes read_file(const std::string& path) {
-    std::ifstream in(path, std::ios::binary);
-    return Bytes(std::istreambuf_iterator<char>(in), {});
-}
 Bytes pattern(size_t n, unsigned seed) {
     Bytes b(n);
     for (size_t i = 0; i < n; ++i) b[i] = static_cast<uint8_t>(i * 31 + seed * 97 + (i >> 8));

@@ -8,10 +8,18 @@
 
 #include <filesystem>
 #include <fstream>
+#include <iterator>
 #include <string>
 #include <vector>
 
 namespace kova_test {
+
+// The bytes of the file at `path` (none when it cannot be read), as a string or a byte vector.
+template <typename Bytes = std::string>
+Bytes read_file(const std::string& path) {
+    std::ifstream in(path, std::ios::binary);
+    return Bytes(std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>());
+}
 
 struct TempDir {
     std::string path = [] {

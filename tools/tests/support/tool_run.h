@@ -25,7 +25,6 @@ RunResult run_kova(const std::vector<std::string>& args, const std::string& dir,
                    int sigint_after_ms = 0, const std::vector<std::string>& env = {},
                    bool stderr_tty = false);
 
-std::string read_file(const std::string& path);
 void write_file(const std::string& path, const std::string& bytes);
 /* Files in the folder, hidden ones included. */
 size_t count_files(const std::string& dir);
