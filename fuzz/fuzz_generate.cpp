@@ -85,26 +85,19 @@ KOVA_FLT_DSC read_filter(Bytes& in, const KOVA_FORMAT& f) {
             static_cast<int32_t>(f.channels)};
 }
 
-// The three PCM files of a file source. Their content follows from the lengths and amplitude
-// an input gives; they are written only when they differ from what is on disk.
+// The three PCM files of a file source; their content follows from the lengths and amplitude
+// an input gives.
 struct PcmFiles {
     const ScratchFile files[KOVA_SLOT_COUNT] = {ScratchFile("gen-start"), ScratchFile("gen-loop"),
                                                 ScratchFile("gen-end")};
     const char* paths[KOVA_SLOT_COUNT] = {files[0].path(), files[1].path(), files[2].path()};
-    size_t wanted[KOVA_SLOT_COUNT] = {};
-    size_t written[KOVA_SLOT_COUNT] = {SIZE_MAX, SIZE_MAX, SIZE_MAX};
-    uint8_t amplitude = 0;
-    uint8_t written_amplitude = 0;
 
-    void sync() {
+    void write(const size_t (&lengths)[KOVA_SLOT_COUNT], uint8_t amplitude) const {
         static uint8_t pcm[size_t{UINT16_MAX} * 4];
         for (int slot = 0; slot < KOVA_SLOT_COUNT; ++slot) {
-            if (written[slot] == wanted[slot] && written_amplitude == amplitude) continue;
-            make_pcm(pcm, wanted[slot], amplitude, 7u + slot);
-            files[slot].rewrite(pcm, wanted[slot]);
-            written[slot] = wanted[slot];
+            make_pcm(pcm, lengths[slot], amplitude, 7u + slot);
+            files[slot].rewrite(pcm, lengths[slot]);
         }
-        written_amplitude = amplitude;
     }
 };
 
@@ -202,7 +195,6 @@ class Session {
             case kUpdate: {
                 const KOVA_FLT_DSC d = read_filter(in, format_);
                 if (!costly()) break;
-                g_pcm_files.sync();  // a file set reads its files again
                 (op == kAttach ? kova_attach_filter : kova_update_filter)(ctx_, count, &d, &err);
                 break;
             }
@@ -251,9 +243,7 @@ void register_files(Bytes& in, KOVA_CTX* ctx) {
     const size_t lengths[KOVA_SLOT_COUNT] = {in.take<uint16_t>(), in.take<uint16_t>() * size_t{4},
                                              in.take<uint16_t>()};
     const uint8_t amplitude = in.take<uint8_t>();
-    std::memcpy(g_pcm_files.wanted, lengths, sizeof lengths);
-    g_pcm_files.amplitude = amplitude;
-    g_pcm_files.sync();
+    g_pcm_files.write(lengths, amplitude);
     int32_t err = 0;
     const int32_t id = kova_reg_src_byfiles(ctx, g_pcm_files.paths, &err);
     FUZZ_CHECK((id == 1) == (lengths[KOVA_SLOT_LOOP] > 0));

@@ -8,7 +8,9 @@
 // (or -2 when memory runs out); outputs of absent items stay as the caller set them; the tune set
 // equals the record decoded here from the raw bytes (the caller's bytes where the file ends),
 // with the gain adjustment applied; a registration either succeeds with identifier 1 and error 0
-// or fails with a documented code and registers nothing; repeat points lie within their sound;
+// or fails with a documented code and registers nothing; a registered set holds only filters of
+// a known type for at most 8 channels and sounds within their slot's limit, with repeat points
+// within the sound;
 // every generation result is a whole byte count within the buffer; a saved set reads back to a
 // set that saves to the very same bytes.
 #include <algorithm>
@@ -105,11 +107,15 @@ void play_and_resave(KOVA_CTX* ctx, const ScratchFile& saved, const ScratchFile&
     KOVA_TUNE_SET tune{};
     FUZZ_CHECK(kova_get_tuneset(ctx, 1, &tune) == KOVA_OK);
     FUZZ_CHECK(tune.wn_gain == 0.0);  // sources read back are file sources: no noise level
-    KOVA_FLT_DSC flt[KOVA_FLT_TYPE_COUNT] = {};
+    KOVA_FLT_DSC flt[KOVA_FLT_TYPE_COUNT];
+    for (auto& d : flt) d.type = 99;  // marks an element the call did not write
     kova_get_filters(ctx, 1, flt);
+    for (uint32_t i = 0; i < KOVA_FLT_TYPE_COUNT; ++i)  // a filter keeps state per channel
+        FUZZ_CHECK(flt[i].type == 99 || (flt[i].type == i && flt[i].channels <= 8));
     KOVA_RPT_INFO rpt{};
     FUZZ_CHECK(kova_get_rptinfo(ctx, 1, &rpt) == KOVA_OK);
     for (int slot = 0; slot < KOVA_SLOT_COUNT; ++slot) {  // within the sound; -1 when absent
+        FUZZ_CHECK(rpt.len_ms[slot] <= (slot == KOVA_SLOT_LOOP ? 1000 : 200));  // slot limits
         FUZZ_CHECK(-1 <= rpt.rpt_start_ms[slot] && rpt.rpt_start_ms[slot] <= rpt.len_ms[slot]);
         FUZZ_CHECK(-1 <= rpt.rpt_end_ms[slot] && rpt.rpt_end_ms[slot] <= rpt.len_ms[slot]);
     }

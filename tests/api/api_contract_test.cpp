@@ -40,7 +40,8 @@ void check(const std::vector<Row>& rows) {
     for (const Row& r : rows) EXPECT_EQ(r.run(), r.want) << r.call;
 }
 
-// Whatever a refused call could have touched in a live context with one set.
+// Whatever a refused call could have touched in a live context with one set: every byte of the
+// context, its previous event and equaliser, and what the set holds.
 std::vector<double> snapshot(KOVA_CTX* ctx) {
     KOVA_TUNE_SET t{};
     KOVA_RPT_INFO info{};
@@ -48,11 +49,12 @@ std::vector<double> snapshot(KOVA_CTX* ctx) {
     kova_get_rptinfo(ctx, 1, &info);
     std::vector<double> v = kova_test::tune_values(t);
     const KOVA_SRCSET* set = kova_test::set_of(ctx, 1);
-    v.insert(v.end(),
-             {double(kova_get_src_num(ctx)), double(ctx->active_src), ctx->volume, set->thickness,
-              ctx->eq->low_gain, double(ctx->stroke), ctx->prev_env, double(ctx->prev_param->time),
-              double(set->filters->count), double(set->src[KOVA_SLOT_LOOP]->pos),
-              double(info.rpt_end_ms[1]), double(set->src[KOVA_SLOT_LOOP]->pcm_proc[100])});
+    v.insert(v.end(), {double(kova_get_src_num(ctx)), set->thickness, double(set->filters->count),
+                       double(set->src[KOVA_SLOT_LOOP]->pos), double(info.rpt_end_ms[1]),
+                       double(set->src[KOVA_SLOT_LOOP]->pcm_proc[100])});
+    for (auto [p, n] : {std::pair<const void*, size_t>{ctx, sizeof *ctx},
+                        {ctx->prev_param, sizeof(KOVA_PARAM)}, {ctx->eq, sizeof(KOVA_EQ)}})
+        v.insert(v.end(), static_cast<const uint8_t*>(p), static_cast<const uint8_t*>(p) + n);
     return v;
 }
 
@@ -67,6 +69,10 @@ TEST(ApiContract, EngineCallsRefuseNullDeadAndOutOfRange) {
     dead.format = reinterpret_cast<KOVA_FORMAT*>(0x10);
     dead.work_buf = reinterpret_cast<int16_t*>(0x20);
     const KOVA_CTX dead_copy = dead;
+    // An open stroke, so that a move that was not refused would play.
+    std::vector<int16_t> block(1536);
+    kova_test::gen(ctx, kova_test::event(100, 100, 1000, KOVA_ACTION_START), block);
+    ASSERT_EQ(kova_test::gen(ctx, kova_test::event(130, 140, 1016, 1), block), 3072);
     const std::vector<double> before = snapshot(ctx);
 
     const std::string path = dir.file("never");
@@ -136,14 +142,26 @@ TEST(ApiContract, EngineCallsRefuseNullDeadAndOutOfRange) {
         });
     }
     // Generation: both entry points refuse the same requests, leaving the buffer alone.
+    // So do a context without a playable set: none active, or one without a loop sound.
     const KOVA_PARAM bad[] = {
         kova_test::event(-1, 140, 1032, 1), kova_test::event(170, -0.5f, 1032, 1),
-        kova_test::event(170, 140, -1, 1), kova_test::event(170, 140, 1032, 3)};
+        kova_test::event(-INFINITY, 140, 1032, 1), kova_test::event(170, 140, -1, 1),
+        kova_test::event(170, 140, 1032, 3)};
+    KOVA_SRC*& loop = kova_test::set_of(ctx, 1)->src[KOVA_SLOT_LOOP];
+    KOVA_SRC* const saved_loop = loop;
     for (auto gen : {kova_gen_sounds, kova_gen_samples}) {
         check({R(gen(nullptr, &move, &out), 0), R(gen(&dead, &move, &out), 0),
                R(gen(ctx, nullptr, &out), 0), R(gen(ctx, &move, nullptr), 0),
                R(gen(ctx, &move, &empty), 0), R(gen(ctx, &move, &no_data), 0)});
         for (const KOVA_PARAM& ev : bad) check({R(gen(ctx, &ev, &out), 0)});
+        for (int32_t active : {0, 2, -1}) {
+            ctx->active_src = active;
+            check({R(gen(ctx, &move, &out), 0)});
+        }
+        ctx->active_src = 1;
+        loop = nullptr;
+        check({R(gen(ctx, &move, &out), 0)});
+        loop = saved_loop;
     }
     kova_set_param(nullptr, &move);
     kova_set_param(ctx->prev_param, nullptr);
@@ -154,6 +172,7 @@ TEST(ApiContract, EngineCallsRefuseNullDeadAndOutOfRange) {
     EXPECT_EQ(pcm, std::vector<int16_t>(64, 0x5A5A));
     EXPECT_FALSE(std::filesystem::exists(path));
     EXPECT_EQ(kova_set_active_src(ctx, 1), KOVA_OK);  // still fully usable
+    EXPECT_EQ(kova_gen_sounds(ctx, &move, &out), 128);
 }
 
 TEST(ApiContract, SignalFileStreamAndListCallsRefuseNullAndWrongTags) {
@@ -361,6 +380,7 @@ TEST_F(JavaContract, MethodsRefuseIdsWithoutInstanceOrContext) {
     for (jlong id = 2; id <= KOVA_MAX_INSTANCES; ++id) ASSERT_EQ(jni_test::init_default(), id);
     EXPECT_EQ(JAVA(set_1volume, KOVA_MAX_INSTANCES, 0.5), 0);
     EXPECT_EQ(jni_test::init_default(), 0);
+    EXPECT_EQ(jni_test::jni_lines(cap).back(), "KOVA instance MAX");
 }
 
 }  // namespace

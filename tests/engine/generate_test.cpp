@@ -350,43 +350,4 @@ TEST(GenEqKernelTest, NormalisingWithoutTheDividerIsExact) {
     EXPECT_TRUE(exact(INT32_MAX));
 }
 
-// Refused requests return 0 and change neither the context, the loop nor the buffer.
-TEST_F(GenTest, RefusalsChangeNothing) {
-    ASSERT_EQ(gen(ctx.get(), event(100, 100, 1000, KOVA_ACTION_START), buf), 0);
-    ASSERT_EQ(gen(ctx.get(), event(130, 140, 1016, KOVA_ACTION_MOVE), buf), 3072);
-    // Byte images: every field of the context and of the previous event must stay as it was.
-    auto image = [](const void* p, size_t n) {
-        return std::string(static_cast<const char*>(p), n);
-    };
-    const std::string before = image(ctx.get(), sizeof(KOVA_CTX));
-    const std::string prev = image(ctx->prev_param, sizeof(KOVA_PARAM));
-    const int32_t pos = loop_src()->pos;
-    std::vector<int16_t> small(64, 0x5A5A);
-    KOVA_PCMBUF out{small.data(), 128};
-    const KOVA_PARAM good = event(170, 140, 1032, KOVA_ACTION_MOVE);
-    auto refused = [&](KOVA_CTX* c, const KOVA_PARAM* p, KOVA_PCMBUF* o) {
-        EXPECT_EQ(kova_gen_sounds(c, p, o), 0);
-        EXPECT_EQ(kova_gen_samples(c, p, o), 0);
-    };
-    // Null, dead and out-of-range arguments are rows of the contract table; here the states of a
-    // live context that cannot play.
-    const KOVA_PARAM far_left = event(-INFINITY, 140, 1032, 1);
-    refused(ctx.get(), &far_left, &out);
-    for (int32_t active : {0, 2, -1}) {
-        ctx->active_src = active;
-        refused(ctx.get(), &good, &out);
-    }
-    ctx->active_src = 1;
-    KOVA_SRC* saved = loop_src();
-    set->src[KOVA_SLOT_LOOP] = nullptr;  // a set without a loop source
-    refused(ctx.get(), &good, &out);
-    set->src[KOVA_SLOT_LOOP] = saved;
-
-    EXPECT_EQ(image(ctx.get(), sizeof(KOVA_CTX)), before);
-    EXPECT_EQ(image(ctx->prev_param, sizeof(KOVA_PARAM)), prev);
-    EXPECT_EQ(loop_src()->pos, pos);
-    EXPECT_EQ(small, std::vector<int16_t>(64, 0x5A5A));
-    EXPECT_EQ(kova_gen_sounds(ctx.get(), &good, &out), 128);  // still usable
-}
-
 }  // namespace
