@@ -11,13 +11,13 @@ final class KovaTestHooks {
 
     static {
         System.loadLibrary("KovaTestHooks");
-        takeLogLines();
+        takeLog();
         try {
             Class.forName("com.corvane.audio.Kova", true, KovaTestHooks.class.getClassLoader());
         } catch (ClassNotFoundException e) {
             throw new ExceptionInInitializerError(e);
         }
-        LOAD_LINES = List.of(takeLogLines());
+        LOAD_LINES = List.of(takeLog().split("\n"));
     }
 
     private KovaTestHooks() {}
@@ -30,5 +30,6 @@ final class KovaTestHooks {
 
     static native byte[] capture();
 
-    private static native String[] takeLogLines();
+    // The library's lines since the last call, each ended by a newline.
+    private static native String takeLog();
 }

@@ -14,18 +14,16 @@
 namespace {
 
 std::mutex g_log_lock;
-std::vector<std::string> g_log_lines;
+std::string g_log;  // one line after another, each ended by a newline
 
 /* Keeps the lines of the library's Java-facing layer; a line at another priority than info is
  * kept with its priority in front, so a test comparing texts notices it. */
 void capture_logger(const __android_logger_data* data, const char* message) {
     if (!data || !data->tag || std::string(data->tag) != "kova_jni") return;
-    std::string line = message ? message : "";
-    if (data->priority != ANDROID_LOG_INFO) {
-        line = "[priority " + std::to_string(data->priority) + "] " + line;
-    }
     std::lock_guard<std::mutex> lock(g_log_lock);
-    g_log_lines.push_back(std::move(line));
+    if (data->priority != ANDROID_LOG_INFO)
+        g_log += "[priority " + std::to_string(data->priority) + "] ";
+    g_log += std::string(message ? message : "") + "\n";
 }
 
 }  // namespace
@@ -58,21 +56,11 @@ JNIEXPORT jbyteArray JNICALL Java_com_corvane_audio_KovaTestHooks_capture(JNIEnv
     return out;
 }
 
-JNIEXPORT jobjectArray JNICALL Java_com_corvane_audio_KovaTestHooks_takeLogLines(JNIEnv* env,
-                                                                                 jclass) {
-    std::vector<std::string> lines;
-    {
-        std::lock_guard<std::mutex> lock(g_log_lock);
-        lines.swap(g_log_lines);
-    }
-    jclass string_class = env->FindClass("java/lang/String");
-    if (!string_class) return nullptr;
-    jobjectArray out = env->NewObjectArray(static_cast<jsize>(lines.size()), string_class, nullptr);
-    for (jsize i = 0; out && i < static_cast<jsize>(lines.size()); ++i) {
-        jstring s = env->NewStringUTF(lines[i].c_str());
-        env->SetObjectArrayElement(out, i, s);
-        env->DeleteLocalRef(s);
-    }
+/* The lines captured since the last call, taken out of the capture. */
+JNIEXPORT jstring JNICALL Java_com_corvane_audio_KovaTestHooks_takeLog(JNIEnv* env, jclass) {
+    std::lock_guard<std::mutex> lock(g_log_lock);
+    const jstring out = env->NewStringUTF(g_log.c_str());
+    g_log.clear();
     return out;
 }
 
