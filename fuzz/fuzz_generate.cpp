@@ -22,7 +22,6 @@
 // that does not continue an open stroke produces nothing.
 #include <cstdint>
 #include <cstring>
-#include <string>
 
 #include "fuzz_support.h"
 

@@ -2,14 +2,11 @@
 #include "fuzz_support.h"
 
 #include <sanitizer/asan_interface.h>  // the poisoning macros do nothing without ASan
-#include <unistd.h>
 
 #include <algorithm>
 #include <cstdio>
 #include <cstdlib>
-#include <filesystem>
 #include <fstream>
-#include <iterator>
 
 #include "util/kova_mem.h"
 
@@ -20,24 +17,10 @@ void fail(const char* what, const char* file, int line) {
     std::abort();
 }
 
-ScratchFile::ScratchFile(const char* tag) {
-    path_ = std::filesystem::temp_directory_path() /
-            ("kova-fuzz-" + std::to_string(getpid()) + "-" + tag);
-}
-
-void ScratchFile::remove() const {
-    unlink(path_.c_str());
-}
-
 void ScratchFile::rewrite(const void* data, size_t size) const {
     std::ofstream out(path_, std::ios::binary | std::ios::trunc);
     out.write(static_cast<const char*>(data), static_cast<std::streamsize>(size));
     FUZZ_CHECK(out.good());
-}
-
-std::string ScratchFile::read() const {
-    std::ifstream in(path_, std::ios::binary);
-    return {std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>()};
 }
 
 namespace {

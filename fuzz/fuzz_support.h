@@ -1,12 +1,17 @@
 // SPDX-License-Identifier: Apache-2.0
-// Helpers shared by the fuzz targets and the seed-corpus generator: a byte reader over the fuzz
-// input, scratch files, a guarded output buffer and a checked stroke through kova_gen_sounds.
+// Helpers shared by the fuzz targets: a byte reader over the fuzz input, scratch files, a guarded
+// output buffer and a checked stroke through kova_gen_sounds.
 #ifndef KOVA_FUZZ_SUPPORT_H
 #define KOVA_FUZZ_SUPPORT_H
+
+#include <unistd.h>
 
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
+#include <filesystem>
+#include <fstream>
+#include <iterator>
 #include <string>
 
 #include "kova/kova.h"
@@ -52,15 +57,20 @@ class Bytes {
 // whole content.
 class ScratchFile {
    public:
-    explicit ScratchFile(const char* tag);
+    explicit ScratchFile(const char* tag)
+        : path_(std::filesystem::temp_directory_path() /
+                ("kova-fuzz-" + std::to_string(getpid()) + "-" + tag)) {}
     ~ScratchFile() { remove(); }
     ScratchFile(const ScratchFile&) = delete;
     ScratchFile& operator=(const ScratchFile&) = delete;
     void rewrite(const void* data, size_t size) const;
-    void remove() const;
+    void remove() const { unlink(path_.c_str()); }
     const char* path() const { return path_.c_str(); }
     // The current content (empty when the file does not exist).
-    std::string read() const;
+    std::string read() const {
+        std::ifstream in(path_, std::ios::binary);
+        return {std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>()};
+    }
 
    private:
     std::string path_;

@@ -22,7 +22,6 @@ using kova_test::gen;
 
 constexpr double kWorkedEnv = 14.016304347826086;
 constexpr double kWorkedStep = 0.004237078238224637;
-constexpr double kEnvSlopeForTest = 2.5652173913043477;
 
 // Reference loop block: envelope climbing on even samples, gain, panning, equaliser (a fresh
 // one, as in a new context), loop wrap and optionally the slew limiter with decay 0.88.
@@ -103,8 +102,7 @@ TEST_F(GenTest, WorkedMoveMatchesReference) {
 
     const KOVA_PARAM a = event(100, 100, 1000, 0), b = event(130, 140, 1016, 1);
     double energy = 0;
-    EXPECT_EQ(_calc_envelope(&b, &a, &energy, 1.0), 0.0);
-    EXPECT_EQ(_calc_distortion(3.0, 5.0), 5.0);
+    EXPECT_EQ(_calc_envelope(&b, &a, &energy, 1.0), 0.0);  // time running backwards
 }
 
 TEST_F(GenTest, PitchRaiseStagesAndResamples) {
@@ -195,27 +193,6 @@ TEST_F(GenTest, StartAndEndSlots) {
     EXPECT_EQ(ctx->stroke, 1u);
     EXPECT_EQ(ctx->prev_param->x, 90.0f);
     EXPECT_EQ(ctx->prev_env, env);
-}
-
-// NaN compares false, so only a negative coordinate refuses an event: an end at x = NaN closes
-// the stroke, and non-finite moves play with defined results (a NaN axis moves 0 px, an
-// infinite one at full speed). The sanitizer builds check every conversion on the way.
-TEST_F(GenTest, NonFiniteCoordinatesAreEvents) {
-    ASSERT_EQ(gen(ctx.get(), event(100, 100, 1000, KOVA_ACTION_START), buf), 0);
-    EXPECT_EQ(gen(ctx.get(), event(NAN, 100, 1016, KOVA_ACTION_END), buf), 0);
-    EXPECT_EQ(ctx->stroke, 0u);
-    EXPECT_EQ(loop_src()->pos, 0);
-    EXPECT_EQ(gen(ctx.get(), event(130, 140, 1032, KOVA_ACTION_MOVE), buf), 0);  // only opens
-
-    EXPECT_EQ(gen(ctx.get(), event(NAN, 141, 1048, 1), buf), 0);  // NaN x and 1 px in y
-    EXPECT_EQ(gen(ctx.get(), event(NAN, 181, 1064, 1), buf), 3072);
-    EXPECT_EQ(ctx->prev_env, 6.0 + 2.5 * kEnvSlopeForTest);  // 40 px in 16 ms
-    EXPECT_TRUE(std::all_of(buf.begin(), buf.begin() + 1536, [](int16_t s) { return s == 0; }));
-    EXPECT_EQ(gen(ctx.get(), event(300, 181, 1080, 1), buf), 0);  // NaN x before, no y move
-    EXPECT_EQ(gen(ctx.get(), event(INFINITY, 181, 1096, 1), buf), 3072);
-    EXPECT_EQ(ctx->prev_env, 65.0);
-    EXPECT_EQ(gen(ctx.get(), event(200, INFINITY, 1112, KOVA_ACTION_END), buf), 0);
-    EXPECT_EQ(ctx->stroke, 0u);
 }
 
 // Start sound with panning depth 0.4: gain 1 * 0.6 * 0.8 * 0.4. First odd-length varied sounds,

@@ -2,7 +2,6 @@
 // Repeat points in milliseconds: conversions with known numbers, reading and storing them.
 #include <gtest/gtest.h>
 
-#include <string>
 #include <vector>
 
 #include "engine/engine_fixture.h"

@@ -7,7 +7,6 @@
 // benchmarks' counting malloc, which the sanitizer builds leave out.
 #include <gtest/gtest.h>
 
-#include <atomic>
 #include <algorithm>
 #include <functional>
 #include <string>

@@ -91,9 +91,9 @@ struct Opened {
 };
 
 // Saves `set` through the access layer and releases it.
-void save(KOVA_SRCSET* set, const std::string& path, int rate = 48000, int channels = 2) {
+void save(KOVA_SRCSET* set, const std::string& path) {
     Opened f(path, 1);
-    kova_write_srcset(rate, channels, set, &f.m, f.h);
+    kova_write_srcset(48000, 2, set, &f.m, f.h);
     kova_free_sourceset(set);
 }
 
@@ -121,16 +121,15 @@ std::string printed(const std::function<int()>& query, int want_rc) {
     return testing::internal::GetCapturedStdout();
 }
 
-// A file with two filters of one type and a loop stored at 44100 Hz mono.
-TEST(FileQueries, TwoFiltersOfOneTypeAndAnotherFormat) {
+// A file with two filters of one type: the queries' lines, the stored tune set and the last filter
+// of the type. (Slot offsets: the tool's inspect test; outputs of absent items left alone: the
+// set-file fuzzer, on every input.)
+TEST(FileQueries, PrintTheirLinesAndTakeTheLastFilterOfAType) {
     TempDir t;
     const std::string p = t.file("b");
     save(make_set({dsc(KOVA_FLT_HIGHPASS, 200.0), dsc(KOVA_FLT_HIGHPASS, 900.0, 1)}, tune(0.3, 0.0),
                   nullptr, make_src(1, pattern(8820, 1), 0, 4410)),
-         p, 44100, 1);
-    std::vector<int> o(6, -7);  // offset and size of each slot; -7 where nothing was written
-    ASSERT_EQ(kova_get_pcminfo_fromfile(p.c_str(), &o[0], &o[1], &o[2], &o[3], &o[4], &o[5]), 0);
-    EXPECT_EQ(o, (std::vector<int>{-7, -7, 240, 8820, -7, -7}));
+         p);
     KOVA_TUNE_SET tn{};
     EXPECT_EQ(printed([&] { return kova_get_tuneset_fromfile(p.c_str(), &tn); }, 0),
               "kova_get_tuneset_fromfile(" + p + ")\n");
@@ -139,7 +138,6 @@ TEST(FileQueries, TwoFiltersOfOneTypeAndAnotherFormat) {
     EXPECT_EQ(printed([&] { return kova_get_filters_fromfile(p.c_str(), out); }, 0),
               "kova_get_filters_fromfile(" + p + ")\n");
     EXPECT_TRUE(out[1].type == 1 && out[1].freq == 900.0 && out[1].enable == 1);
-    EXPECT_EQ(out[0].type + out[2].type + out[3].type, 21u);  // untouched
     // The line for a missing or null path (the codes are rows of the contract table).
     const std::string missing = t.file("missing");
     EXPECT_EQ(printed([&] { return kova_get_tuneset_fromfile(missing.c_str(), &tn); }, -3),
