@@ -54,7 +54,7 @@ TEST(Equaliser, ThicknessTradesLowBandAgainstHighBand) {
     EXPECT_LT(level_at(1.0, 15000), 0.85);
 }
 
-TEST(Equaliser, ConstantSettlesAtLowGainPlusBiasAndSaturates) {
+TEST(Equaliser, ConstantSettlesAtLowGainPlusBias) {
     // Steady state of each section: state = x + bias / coef. Crossovers of 1 and 2 Hz make
     // the bias terms worth thousands of units, so each one is visible.
     KOVA_EQ eq;
