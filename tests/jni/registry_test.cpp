@@ -53,6 +53,18 @@ bool is_free(pthread_mutex_t* lock) {
     return true;
 }
 
+// A lookup initialises an uninitialised registry first; after that only the in-use flag marks a
+// slot taken, whatever its process id says.
+TEST_F(Registry, LookupInitialisesFirstAndGoesByTheInUseFlag) {
+    pKOVAInfoIsInited = 0;
+    pKOVAInfo[0] = KovaInfo{5, nullptr, 1};  // what static memory would not hold
+    EXPECT_EQ(_KovaInfoGetIndex(), 0);
+    EXPECT_EQ(pKOVAInfo[0].isUsed, 0);
+    pKOVAInfo[0] = KovaInfo{-1, nullptr, 1};
+    pKOVAInfo[1] = KovaInfo{7, nullptr, 0};
+    EXPECT_EQ(_KovaInfoGetIndex(), 1);
+}
+
 // The sweeps report every slot they reach, with the engine result of the sweep's last teardown
 // for a slot they cannot free: the one for a process frees only that process's instances, the
 // unload hook's every other one, and it leaves the registry lock alive and unlocked.
